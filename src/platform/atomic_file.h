@@ -1,0 +1,39 @@
+#pragma once
+// Replacing a user's file without ever leaving it half written: write a
+// temporary file beside it (same folder, so the rename cannot cross file
+// systems), then rename it over the target. A failed or abandoned write
+// leaves the old file as it was and removes the temporary.
+
+#include <cstdint>
+#include <filesystem>
+#include <span>
+
+#include "platform/error.h"
+
+namespace cloudreel {
+
+class AtomicFileReplacement {
+ public:
+  explicit AtomicFileReplacement(std::filesystem::path target);
+  // Removes the temporary file unless committed.
+  ~AtomicFileReplacement();
+  AtomicFileReplacement(const AtomicFileReplacement&) = delete;
+  AtomicFileReplacement& operator=(const AtomicFileReplacement&) = delete;
+
+  const std::filesystem::path& target() const { return target_; }
+  // Where the writer puts the new contents (for writers that take a path).
+  const std::filesystem::path& temporaryPath() const { return temporary_; }
+  // Renames the finished temporary over the target.
+  [[nodiscard]] bool commit(Error* error);
+
+ private:
+  std::filesystem::path target_;
+  std::filesystem::path temporary_;
+  bool committed_ = false;
+};
+
+// Writes the bytes to the path atomically, flushed to disk before the rename.
+[[nodiscard]] bool writeFileAtomically(const std::filesystem::path& path,
+                                       std::span<const std::uint8_t> bytes, Error* error);
+
+}  // namespace cloudreel

@@ -1,0 +1,162 @@
+#include "platform/run_loop.h"
+
+namespace cloudreel {
+
+RunLoop& RunLoop::main() {
+  static RunLoop loop;
+  return loop;
+}
+
+void RunLoop::post(Task task) {
+  {
+    std::lock_guard lock(mutex_);
+    tasks_.push_back(std::move(task));
+  }
+  wake_.notify_all();
+}
+
+RunLoop::TimerId RunLoop::scheduleTimer(Clock::duration interval, bool repeats, Task task) {
+  std::lock_guard lock(mutex_);
+  const TimerId id = nextTimer_++;
+  timers_.emplace(id, Timer{Clock::now() + interval, interval, repeats, std::move(task)});
+  wake_.notify_all();
+  return id;
+}
+
+void RunLoop::invalidateTimer(TimerId id) {
+  std::lock_guard lock(mutex_);
+  timers_.erase(id);
+}
+
+bool RunLoop::isTimerValid(TimerId id) const {
+  std::lock_guard lock(mutex_);
+  return timers_.contains(id);
+}
+
+bool RunLoop::runOne() {
+  Task task;
+  {
+    std::lock_guard lock(mutex_);
+    if (!tasks_.empty()) {
+      task = std::move(tasks_.front());
+      tasks_.pop_front();
+    } else {
+      const auto now = Clock::now();
+      for (auto& [id, timer] : timers_) {
+        if (timer.due <= now) {
+          task = timer.task;
+          if (timer.repeats) {
+            timer.due = now + timer.interval;
+          } else {
+            timers_.erase(id);
+          }
+          break;
+        }
+      }
+    }
+  }
+  if (!task) {
+    return false;
+  }
+  task();
+  return true;
+}
+
+bool RunLoop::runPending() {
+  bool ran = false;
+  // Only what is ready now: tasks posted by these tasks wait for the next
+  // pass, so a task that re-posts itself cannot starve the caller.
+  std::size_t budget;
+  {
+    std::lock_guard lock(mutex_);
+    budget = tasks_.size() + timers_.size();
+  }
+  while (budget-- > 0 && runOne()) {
+    ran = true;
+  }
+  return ran;
+}
+
+void RunLoop::runUntil(Clock::time_point deadline) {
+  runUntil([] { return false; }, deadline - Clock::now());
+}
+
+bool RunLoop::runUntil(const std::function<bool()>& condition, Clock::duration timeout) {
+  const auto deadline = Clock::now() + timeout;
+  {
+    std::lock_guard lock(mutex_);
+    stopRequested_ = false;
+  }
+  while (true) {
+    if (condition()) {
+      return true;
+    }
+    if (runOne()) {
+      continue;
+    }
+    std::unique_lock lock(mutex_);
+    if (stopRequested_) {
+      stopRequested_ = false;
+      return condition();
+    }
+    auto wakeAt = deadline;
+    for (const auto& [id, timer] : timers_) {
+      wakeAt = std::min(wakeAt, timer.due);
+    }
+    if (Clock::now() >= deadline) {
+      return condition();
+    }
+    wake_.wait_until(lock, wakeAt, [this] { return !tasks_.empty() || stopRequested_; });
+  }
+}
+
+void RunLoop::stop() {
+  {
+    std::lock_guard lock(mutex_);
+    stopRequested_ = true;
+  }
+  wake_.notify_all();
+}
+
+BackgroundQueue::BackgroundQueue()
+    : thread_([this](const std::stop_token& stop) { loop(stop); }) {}
+
+BackgroundQueue::~BackgroundQueue() {
+  thread_.request_stop();
+  wake_.notify_all();
+  // The jthread joins here, after the queue has drained.
+}
+
+void BackgroundQueue::async(std::function<void()> work) {
+  {
+    std::lock_guard lock(mutex_);
+    work_.push_back(std::move(work));
+  }
+  wake_.notify_all();
+}
+
+void BackgroundQueue::async(std::function<void()> work, RunLoop& completionLoop,
+                            std::function<void()> completion) {
+  async([work = std::move(work), &completionLoop, completion = std::move(completion)]() mutable {
+    work();
+    completionLoop.post(std::move(completion));
+  });
+}
+
+void BackgroundQueue::loop(const std::stop_token& stop) {
+  while (true) {
+    std::function<void()> next;
+    {
+      std::unique_lock lock(mutex_);
+      wake_.wait(lock, stop, [this] { return !work_.empty(); });
+      if (work_.empty()) {
+        return;  // stop requested and nothing left to do
+      }
+      next = std::move(work_.front());
+      work_.pop_front();
+    }
+    next();
+  }
+}
+
+}  // namespace cloudreel
