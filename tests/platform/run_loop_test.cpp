@@ -1,0 +1,78 @@
+#include "platform/run_loop.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <thread>
+
+namespace cloudreel {
+namespace {
+
+using namespace std::chrono_literals;
+
+TEST(RunLoop, RunsPostedTasksInOrderOnItsOwnThread) {
+  RunLoop loop;
+  std::vector<int> order;
+  const auto loopThread = std::this_thread::get_id();
+  std::thread poster([&] {
+    for (int i = 0; i < 3; ++i) {
+      loop.post([&, i] {
+        EXPECT_EQ(std::this_thread::get_id(), loopThread);
+        order.push_back(i);
+      });
+    }
+  });
+  poster.join();
+  EXPECT_TRUE(loop.runUntil([&] { return order.size() == 3; }, 5s));
+  EXPECT_EQ(order, std::vector<int>({0, 1, 2}));
+}
+
+TEST(RunLoop, RepeatingTimerFiresUntilInvalidatedFromItsOwnTask) {
+  RunLoop loop;
+  int fired = 0;
+  RunLoop::TimerId id = 0;
+  id = loop.scheduleTimer(1ms, true, [&] {
+    if (++fired == 3) {
+      loop.invalidateTimer(id);
+    }
+  });
+  EXPECT_TRUE(loop.runUntil([&] { return !loop.isTimerValid(id); }, 5s));
+  EXPECT_EQ(fired, 3);
+  loop.invalidateTimer(id);  // already gone: harmless
+  int once = 0;
+  const auto single = loop.scheduleTimer(0ms, false, [&] { ++once; });
+  EXPECT_TRUE(loop.runUntil([&] { return once == 1; }, 5s));
+  EXPECT_FALSE(loop.isTimerValid(single));
+}
+
+TEST(RunLoop, StopEndsARunFromAnotherThread) {
+  RunLoop loop;
+  std::thread stopper([&] { loop.stop(); });
+  loop.runUntil(RunLoop::Clock::now() + 10s);  // returns long before the deadline
+  stopper.join();
+  SUCCEED();
+}
+
+TEST(BackgroundQueue, RunsWorkOffTheMainThreadAndPostsCompletionBack) {
+  RunLoop loop;
+  const auto mainThread = std::this_thread::get_id();
+  std::thread::id workThread;
+  bool completed = false;
+  std::atomic<int> later{0};
+  {
+    BackgroundQueue queue;
+    queue.async([&] { workThread = std::this_thread::get_id(); }, loop, [&] {
+      EXPECT_EQ(std::this_thread::get_id(), mainThread);
+      completed = true;
+    });
+    EXPECT_TRUE(loop.runUntil([&] { return completed; }, 5s));
+    for (int i = 0; i < 10; ++i) {
+      queue.async([&] { ++later; });
+    }
+  }  // destruction finishes the queued work
+  EXPECT_NE(workThread, mainThread);
+  EXPECT_EQ(later, 10);
+}
+
+}  // namespace
+}  // namespace cloudreel
