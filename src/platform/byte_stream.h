@@ -30,7 +30,7 @@ class InputStream {
  public:
   virtual ~InputStream();
   // Reads exactly `size` bytes from the current position; answers NO when
-  // fewer remain or reading failed, and the position is then unspecified.
+  // fewer remain or reading failed, and the position is then not to be relied on.
   virtual bool read(void* data, std::size_t size) = 0;
   // Positions are byte offsets from the start; seeking past the end answers NO.
   virtual bool seek(std::uint64_t position) = 0;
