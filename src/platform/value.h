@@ -51,6 +51,26 @@ I saturatingCast(double v) {
   return static_cast<I>(v);
 }
 
+// A double narrowed to float as IEEE rounding does, with values beyond the
+// float range becoming infinities explicitly (a plain cast of such a value is
+// undefined behaviour in C++).
+inline float narrowToFloat(double v) {
+  constexpr double kMax = static_cast<double>(std::numeric_limits<float>::max());
+  if (v > kMax || v < -kMax) {
+    // Values that round to the largest float still do so; only those past
+    // the rounding boundary become infinite. A NaN falls through below.
+    const double boundary = kMax + std::ldexp(1.0, 103);  // half an ulp above the largest float
+    if (v >= boundary) {
+      return std::numeric_limits<float>::infinity();
+    }
+    if (v <= -boundary) {
+      return -std::numeric_limits<float>::infinity();
+    }
+    return v > 0 ? std::numeric_limits<float>::max() : -std::numeric_limits<float>::max();
+  }
+  return static_cast<float>(v);
+}
+
 // A number of any kind as the requested arithmetic type; empty for null,
 // strings and objects.
 template <typename T>
@@ -64,6 +84,8 @@ std::optional<T> numberAs(const Value& value) {
           return std::nullopt;
         } else if constexpr (std::is_same_v<T, bool>) {
           return v != V{};
+        } else if constexpr (std::is_same_v<T, float> && std::is_same_v<V, double>) {
+          return narrowToFloat(v);
         } else if constexpr (std::is_floating_point_v<T>) {
           return static_cast<T>(v);
         } else if constexpr (std::is_floating_point_v<V>) {
