@@ -1,0 +1,168 @@
+#include "render/gl/image_file.h"
+
+#include <gtest/gtest.h>
+#include <tiffio.h>
+
+#include <fstream>
+
+#include "support/temp_dir.h"
+
+namespace cloudreel::gl {
+namespace {
+
+// 3 × 2 pixels; each pixel's colour encodes its position so that a
+// transposed or flipped read shows.
+RgbaImage colourPattern() {
+  RgbaImage image;
+  image.width = 3;
+  image.height = 2;
+  for (int y = 0; y < 2; ++y) {
+    for (int x = 0; x < 3; ++x) {
+      const auto v = static_cast<std::uint8_t>(10 * (y * 3 + x));
+      image.pixels.insert(image.pixels.end(), {v, static_cast<std::uint8_t>(v + 1),
+                                               static_cast<std::uint8_t>(v + 2), 77});
+    }
+  }
+  return image;
+}
+
+DepthImage depthPattern() {
+  return DepthImage{2, 3, {0, 1, 256, 4660, 65534, 65535}};
+}
+
+void expectColourPattern(const TiffImage& tiff) {
+  EXPECT_EQ(tiff.width, 3);
+  EXPECT_EQ(tiff.height, 2);
+  EXPECT_EQ(tiff.samplesPerPixel, 3);
+  EXPECT_EQ(tiff.bitsPerSample, 8);
+  EXPECT_EQ(tiff.photometric, PHOTOMETRIC_RGB);
+  EXPECT_EQ(tiff.orientation, ORIENTATION_TOPLEFT);
+  for (int y = 0; y < 2; ++y) {
+    for (int x = 0; x < 3; ++x) {
+      const int v = 10 * (y * 3 + x);
+      EXPECT_EQ(tiff.sample(x, y, 0), v) << x << ", " << y;
+      EXPECT_EQ(tiff.sample(x, y, 1), v + 1) << x << ", " << y;
+      EXPECT_EQ(tiff.sample(x, y, 2), v + 2) << x << ", " << y;
+    }
+  }
+}
+
+void expectDepthPattern(const TiffImage& tiff) {
+  EXPECT_EQ(tiff.width, 2);
+  EXPECT_EQ(tiff.height, 3);
+  EXPECT_EQ(tiff.samplesPerPixel, 1);
+  EXPECT_EQ(tiff.bitsPerSample, 16);
+  EXPECT_EQ(tiff.photometric, PHOTOMETRIC_MINISBLACK);
+  EXPECT_EQ(tiff.orientation, ORIENTATION_TOPLEFT);
+  EXPECT_EQ(tiff.samples, depthPattern().values);
+}
+
+TEST(ImageFile, ColourFramesAreRgbEightBitTopRowFirst) {
+  std::vector<std::uint8_t> bytes;
+  Error error;
+  ASSERT_TRUE(encodeColorTiff(colourPattern(), bytes, &error)) << error.message;
+  auto tiff = decodeTiff(bytes, &error);
+  ASSERT_TRUE(tiff) << error.message;
+  expectColourPattern(*tiff);
+}
+
+TEST(ImageFile, DepthFramesAreSixteenBitMinIsBlackGrey) {
+  std::vector<std::uint8_t> bytes;
+  Error error;
+  ASSERT_TRUE(encodeDepthTiff(depthPattern(), bytes, &error)) << error.message;
+  auto tiff = decodeTiff(bytes, &error);
+  ASSERT_TRUE(tiff) << error.message;
+  expectDepthPattern(*tiff);
+}
+
+TEST(ImageFile, WritesReplaceTheTargetAndLeaveNoTemporaryFile) {
+  const testing::TempDir dir;
+  const auto colour = dir / "frame.0001.tif";
+  const auto depth = dir / "depth.0001.tif";
+  {
+    std::ofstream old(colour);
+    old << "an older frame";
+  }
+  Error error;
+  ASSERT_TRUE(writeColorTiff(colour, colourPattern(), &error)) << error.message;
+  ASSERT_TRUE(writeDepthTiff(depth, depthPattern(), &error)) << error.message;
+  auto readColour = readTiff(colour, &error);
+  ASSERT_TRUE(readColour) << error.message;
+  expectColourPattern(*readColour);
+  auto readDepth = readTiff(depth, &error);
+  ASSERT_TRUE(readDepth) << error.message;
+  expectDepthPattern(*readDepth);
+  int files = 0;
+  for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator(dir.path())) {
+    ++files;
+  }
+  EXPECT_EQ(files, 2);
+}
+
+TEST(ImageFile, RefusesEmptyAndInconsistentImages) {
+  RgbaImage wrongSize = colourPattern();
+  wrongSize.pixels.pop_back();
+  const RgbaImage colourCases[] = {RgbaImage{}, RgbaImage{0, 5, {}}, RgbaImage{4, 0, {}},
+                                   RgbaImage{-1, -1, {}}, wrongSize};
+  for (const RgbaImage& image : colourCases) {
+    std::vector<std::uint8_t> bytes = {1, 2, 3};
+    Error error;
+    EXPECT_FALSE(encodeColorTiff(image, bytes, &error));
+    EXPECT_EQ(error.domain, kImageErrorDomain);
+    EXPECT_EQ(error.code, static_cast<int>(ImageErrorCode::InvalidImage));
+    EXPECT_TRUE(bytes.empty());
+  }
+  const DepthImage depthCases[] = {DepthImage{}, DepthImage{2, 2, {1, 2, 3}}};
+  for (const DepthImage& image : depthCases) {
+    std::vector<std::uint8_t> bytes;
+    Error error;
+    EXPECT_FALSE(encodeDepthTiff(image, bytes, &error));
+    EXPECT_EQ(error.code, static_cast<int>(ImageErrorCode::InvalidImage));
+  }
+}
+
+TEST(ImageFile, AFailedWriteNamesTheFileAndLeavesTheTargetAlone) {
+  const testing::TempDir dir;
+  Error error;
+  const auto missing = dir / "no-such-folder" / "frame.tif";
+  EXPECT_FALSE(writeColorTiff(missing, colourPattern(), &error));
+  EXPECT_EQ(error.code, static_cast<int>(ImageErrorCode::WriteFailed));
+  EXPECT_NE(error.message.find(missing.string()), std::string::npos) << error.message;
+
+  // An empty image must not clobber the frame already there.
+  const auto existing = dir / "frame.tif";
+  ASSERT_TRUE(writeColorTiff(existing, colourPattern(), &error)) << error.message;
+  EXPECT_FALSE(writeColorTiff(existing, RgbaImage{}, &error));
+  EXPECT_NE(error.message.find(existing.string()), std::string::npos) << error.message;
+  auto still = readTiff(existing, &error);
+  ASSERT_TRUE(still) << error.message;
+  expectColourPattern(*still);
+}
+
+TEST(ImageFile, ReadingRejectsWhatIsNotATiffWithAReason) {
+  const std::vector<std::vector<std::uint8_t>> inputs = {
+      {}, {'P', 'N', 'G'}, {'I', 'I', 42, 0, 0xFF, 0xFF, 0xFF, 0x7F}};
+  for (const auto& bytes : inputs) {
+    Error error;
+    EXPECT_FALSE(decodeTiff(bytes, &error)) << bytes.size() << " bytes";
+    EXPECT_EQ(error.domain, kImageErrorDomain);
+    EXPECT_FALSE(error.message.empty());
+  }
+  const testing::TempDir dir;
+  Error error;
+  EXPECT_FALSE(readTiff(dir / "absent.tif", &error));
+  EXPECT_NE(error.message.find("absent.tif"), std::string::npos) << error.message;
+}
+
+TEST(ImageFile, TruncatedFilesFailInsteadOfReadingPastTheEnd) {
+  std::vector<std::uint8_t> bytes;
+  ASSERT_TRUE(encodeColorTiff(colourPattern(), bytes));
+  for (std::size_t keep : {std::size_t{8}, std::size_t{20}, bytes.size() / 2}) {
+    const std::vector<std::uint8_t> truncated(bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(keep));
+    Error error;
+    EXPECT_FALSE(decodeTiff(truncated, &error)) << "kept " << keep << " bytes";
+  }
+}
+
+}  // namespace
+}  // namespace cloudreel::gl
