@@ -47,7 +47,7 @@ bool AtomicFileReplacement::commit(Error* error) {
 }
 
 bool writeFileAtomically(const std::filesystem::path& path, std::span<const std::uint8_t> bytes,
-                         Error* error) {
+                         Error* error, Durability durability) {
   AtomicFileReplacement replacement(path);
   const int fd = ::open(replacement.temporaryPath().c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
   if (fd < 0) {
@@ -68,7 +68,7 @@ bool writeFileAtomically(const std::filesystem::path& path, std::span<const std:
     }
     written += static_cast<std::size_t>(n);
   }
-  const bool synced = ::fsync(fd) == 0;
+  const bool synced = durability == Durability::Unsynced || ::fsync(fd) == 0;
   const int syncError = errno;
   const bool closed = ::close(fd) == 0;
   if (!synced || !closed) {

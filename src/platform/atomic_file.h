@@ -32,8 +32,18 @@ class AtomicFileReplacement {
   bool committed_ = false;
 };
 
-// Writes the bytes to the path atomically, flushed to disk before the rename.
+enum class Durability {
+  // Flushed to the disk before the rename: documents and settings, which a
+  // crash must not lose.
+  Synced,
+  // Renamed as soon as written: rendered frames, which are cheap to redo and
+  // where a flush per frame would cost more than the frame itself.
+  Unsynced,
+};
+
+// Writes the bytes to the path atomically.
 [[nodiscard]] bool writeFileAtomically(const std::filesystem::path& path,
-                                       std::span<const std::uint8_t> bytes, Error* error);
+                                       std::span<const std::uint8_t> bytes, Error* error,
+                                       Durability durability = Durability::Synced);
 
 }  // namespace cloudreel

@@ -1,10 +1,10 @@
 #include "render/gl/image_file.h"
 
+#include "platform/atomic_file.h"
+
 #include <tiffio.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
@@ -190,7 +190,16 @@ bool withFileName(bool ok, const std::filesystem::path& path, std::string_view v
   return ok;
 }
 
-std::atomic<unsigned> gTemporaryCounter{0};
+// Frames replace their file atomically, so a reader never sees half a
+// frame; they are not flushed to the disk one by one.
+bool writeFrameFile(const std::filesystem::path& path, std::span<const std::uint8_t> bytes,
+                    Error* error) {
+  Error fileError;
+  if (writeFileAtomically(path, bytes, &fileError, Durability::Unsynced)) {
+    return true;
+  }
+  return fail(error, ImageErrorCode::WriteFailed, fileError.message);
+}
 
 }  // namespace
 
@@ -228,46 +237,16 @@ bool encodeDepthTiff(const DepthImage& image, std::vector<std::uint8_t>& out, Er
                 });
 }
 
-bool writeFileAtomically(const std::filesystem::path& path, std::span<const std::uint8_t> bytes,
-                         Error* error) {
-  const std::filesystem::path temporary =
-      path.parent_path() / ("." + path.filename().string() + ".tmp-" + std::to_string(getpid()) +
-                            "-" + std::to_string(gTemporaryCounter.fetch_add(1)));
-  auto failure = [&](const std::string& why) {
-    std::error_code ignored;
-    std::filesystem::remove(temporary, ignored);
-    return fail(error, ImageErrorCode::WriteFailed,
-                "Could not write “" + path.string() + "”: " + why + ".");
-  };
-  std::FILE* file = std::fopen(temporary.c_str(), "wb");
-  if (file == nullptr) {
-    return fail(error, ImageErrorCode::WriteFailed,
-                "Could not write “" + path.string() + "”: " + std::strerror(errno) + ".");
-  }
-  const bool written = bytes.empty() || std::fwrite(bytes.data(), 1, bytes.size(), file) == bytes.size();
-  const int savedErrno = errno;
-  // Closing flushes; a full disk may only show here.
-  if (std::fclose(file) != 0 || !written) {
-    return failure(std::strerror(written ? errno : savedErrno));
-  }
-  std::error_code renameError;
-  std::filesystem::rename(temporary, path, renameError);
-  if (renameError) {
-    return failure(renameError.message());
-  }
-  return true;
-}
-
 bool writeColorTiff(const std::filesystem::path& path, const RgbaImage& image, Error* error) {
   std::vector<std::uint8_t> bytes;
   return withFileName(encodeColorTiff(image, bytes, error), path, "write", error) &&
-         writeFileAtomically(path, bytes, error);
+         writeFrameFile(path, bytes, error);
 }
 
 bool writeDepthTiff(const std::filesystem::path& path, const DepthImage& image, Error* error) {
   std::vector<std::uint8_t> bytes;
   return withFileName(encodeDepthTiff(image, bytes, error), path, "write", error) &&
-         writeFileAtomically(path, bytes, error);
+         writeFrameFile(path, bytes, error);
 }
 
 std::optional<TiffImage> decodeTiff(std::span<const std::uint8_t> bytes, Error* error) {

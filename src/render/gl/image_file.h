@@ -42,12 +42,6 @@ enum class ImageErrorCode : int {
 [[nodiscard]] bool writeDepthTiff(const std::filesystem::path& path, const DepthImage& image,
                                   Error* error = nullptr);
 
-// Replaces (or creates) `path` with `bytes` through a temporary file in the
-// same folder and a rename. On failure the target is unchanged and no
-// temporary file is left behind.
-[[nodiscard]] bool writeFileAtomically(const std::filesystem::path& path,
-                                       std::span<const std::uint8_t> bytes, Error* error = nullptr);
-
 // A decoded strip-organised TIFF with 8- or 16-bit samples, interleaved,
 // first row at the top as stored.
 struct TiffImage {
