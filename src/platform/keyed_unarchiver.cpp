@@ -629,34 +629,27 @@ std::optional<std::int64_t> integerIn(std::int64_t min, std::int64_t max, Archiv
 
 }  // namespace
 
-std::int64_t KeyedUnarchiver::decodeInt64ForKey(std::string_view key) {
+template <typename I>
+I KeyedUnarchiver::decodeIntegerForKey(std::string_view key, const char* asked) {
   const Node* node = failed_ ? nullptr : find(key);
   if (node == nullptr || node->type == ArchiveValueType::Null) {
     return 0;
   }
-  auto value = integerIn(std::numeric_limits<std::int64_t>::min(),
-                         std::numeric_limits<std::int64_t>::max(), node->type, node->integer,
-                         node->real, node->boolean);
+  auto value = integerIn(std::numeric_limits<I>::min(), std::numeric_limits<I>::max(),
+                         node->type, node->integer, node->real, node->boolean);
   if (!value) {
-    failWrongType(key, "a 64-bit integer");
+    failWrongType(key, asked);
     return 0;
   }
-  return *value;
+  return static_cast<I>(*value);
+}
+
+std::int64_t KeyedUnarchiver::decodeInt64ForKey(std::string_view key) {
+  return decodeIntegerForKey<std::int64_t>(key, "a 64-bit integer");
 }
 
 std::int32_t KeyedUnarchiver::decodeInt32ForKey(std::string_view key) {
-  const Node* node = failed_ ? nullptr : find(key);
-  if (node == nullptr || node->type == ArchiveValueType::Null) {
-    return 0;
-  }
-  auto value = integerIn(std::numeric_limits<std::int32_t>::min(),
-                         std::numeric_limits<std::int32_t>::max(), node->type, node->integer,
-                         node->real, node->boolean);
-  if (!value) {
-    failWrongType(key, "a 32-bit integer");
-    return 0;
-  }
-  return static_cast<std::int32_t>(*value);
+  return decodeIntegerForKey<std::int32_t>(key, "a 32-bit integer");
 }
 
 double KeyedUnarchiver::decodeDoubleForKey(std::string_view key) {

@@ -136,6 +136,9 @@ class KeyedUnarchiver {
   ObjectPtr objectOrNull(const std::optional<std::size_t>& reference);
   bool readBytes(const Node& node, std::uint8_t* destination);
   void failWrongType(std::string_view key, const char* asked);
+  // An integer of type I under the key; a value outside I's range fails.
+  template <typename I>
+  I decodeIntegerForKey(std::string_view key, const char* asked);
   std::string where() const;
 
   template <class T>
