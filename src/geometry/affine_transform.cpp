@@ -53,8 +53,8 @@ std::shared_ptr<AffineTransform> AffineTransform::initWithQuaternion(
   return made(&AffineTransform::setQuaternionRotation, q);
 }
 
-std::shared_ptr<AffineTransform> AffineTransform::initWithEulerType(
-    const std::array<double, 3>& e, int type) {
+std::shared_ptr<AffineTransform> AffineTransform::initWithEulerType(const std::array<double, 3>& e,
+                                                                    int type) {
   auto result = std::make_shared<AffineTransform>();
   result->setEulerRotationType(e, type);
   return result;
@@ -63,13 +63,14 @@ std::shared_ptr<AffineTransform> AffineTransform::initWithEulerType(
 const PropertyTable& AffineTransform::properties() const {
   static const PropertyTable table(
       &Object::objectProperties(),
-      {property<AffineTransform>("scale", &AffineTransform::scale, &AffineTransform::setScale),
-       property<AffineTransform>("translationX", &AffineTransform::translationX,
-                                 &AffineTransform::setTranslationX),
-       property<AffineTransform>("translationY", &AffineTransform::translationY,
-                                 &AffineTransform::setTranslationY),
-       property<AffineTransform>("translationZ", &AffineTransform::translationZ,
-                                 &AffineTransform::setTranslationZ)});
+      {notifyingProperty<AffineTransform>("scale", &AffineTransform::scale,
+                                          &AffineTransform::setScale),
+       notifyingProperty<AffineTransform>("translationX", &AffineTransform::translationX,
+                                          &AffineTransform::setTranslationX),
+       notifyingProperty<AffineTransform>("translationY", &AffineTransform::translationY,
+                                          &AffineTransform::setTranslationY),
+       notifyingProperty<AffineTransform>("translationZ", &AffineTransform::translationZ,
+                                          &AffineTransform::setTranslationZ)});
   return table;
 }
 
@@ -208,8 +209,7 @@ void AffineTransform::multiply3Vector(std::array<double, 3>& p) const {
 
 float AffineTransform::determinant() const {
   const Matrix& m = mx_;
-  return narrowToFloat(m[0] * (m[5] * m[10] - m[6] * m[9]) +
-                       m[1] * (m[6] * m[8] - m[10] * m[4]) +
+  return narrowToFloat(m[0] * (m[5] * m[10] - m[6] * m[9]) + m[1] * (m[6] * m[8] - m[10] * m[4]) +
                        m[2] * (m[9] * m[4] - m[5] * m[8]));
 }
 
@@ -252,9 +252,7 @@ void AffineTransform::sendKVODidChange() {
 }
 
 namespace {
-std::string elementKey(std::size_t i) {
-  return fmt::sprintf("mx%02d", static_cast<int>(i));
-}
+std::string elementKey(std::size_t i) { return fmt::sprintf("mx%02d", static_cast<int>(i)); }
 }  // namespace
 
 void AffineTransform::encodeWithCoder(KeyedArchiver& coder) const {

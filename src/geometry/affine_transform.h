@@ -5,7 +5,8 @@
 //
 // The transform sends no change notices by itself: its owner brackets a
 // change with sendKVOWillChange / sendKVODidChange, which announce the keys
-// "scale", "translationX", "translationY" and "translationZ".
+// "scale", "translationX", "translationY" and "translationZ". A set of one of
+// those keys by key-value coding is announced, as any observable property's.
 
 #include <array>
 #include <memory>

@@ -182,6 +182,28 @@ Property property(std::string_view key, Getter getter, Setter setter) {
       }};
 }
 
+// The same, for a class whose setter is silent when called directly (the
+// owner announces such changes itself) but whose key-value-coding set must
+// still be observed: the set is bracketed by will/did-change of the key, as
+// for any observable property set by key.
+template <typename C, typename Getter, typename Setter>
+Property notifyingProperty(std::string_view key, Getter getter, Setter setter) {
+  using T = std::decay_t<std::invoke_result_t<Getter, const C&>>;
+  Property p = property<C>(key, getter, setter);
+  p.set = [key, setter](Object& object, const Value& value) {
+    std::optional<T> converted = detail::fromValue<T>(value);
+    if (!converted) {
+      return false;
+    }
+    C& target = static_cast<C&>(object);
+    target.willChangeValueForKey(key);
+    std::invoke(setter, target, std::move(*converted));
+    target.didChangeValueForKey(key);
+    return true;
+  };
+  return p;
+}
+
 template <typename C, typename Getter>
 Property readOnlyProperty(std::string_view key, Getter getter) {
   using T = std::decay_t<std::invoke_result_t<Getter, const C&>>;
