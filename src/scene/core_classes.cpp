@@ -1,0 +1,21 @@
+#include "scene/core_classes.h"
+
+#include "camera/camera.h"
+#include "camera/scene_camera.h"
+#include "geometry/geometry_classes.h"
+#include "platform/class_registry.h"
+#include "scene/layer.h"
+#include "scene/light_source.h"
+
+namespace cloudreel {
+
+void registerCoreClasses(ClassRegistry& registry) {
+  registerGeometryClasses(registry);
+  registry.registerClass<Layer>("Layer");
+  registry.registerClass<AnimatedLayer>("AnimatedLayer");
+  registry.registerClass<LightSource>("LightSource");
+  registry.registerClass<Camera>("Camera");
+  registry.registerClass<SceneCamera>("SceneCamera");
+}
+
+}  // namespace cloudreel

@@ -1,0 +1,221 @@
+#include "scene/my_document.h"
+
+#include <algorithm>
+
+#include "camera/scene_camera.h"
+#include "platform/log.h"
+#include "platform/run_loop.h"
+#include "scene/layer.h"
+#include "scene/light_source.h"
+
+namespace cloudreel {
+
+MyDocument::MyDocument()
+    : sceneCamera_(SceneCamera::initWithZDistance(15.0)),
+      lightSource_(std::make_shared<LightSource>()),
+      undoManager_(&RunLoop::main()) {
+  sceneCamera_->setName("Scene Camera");
+  NotificationCenter::defaultCenter().addObserver(
+      *this, std::string(kGridColorChangedNotification), nullptr,
+      [this](const Notification& n) { handleGridColorChange(n); });
+}
+
+MyDocument::~MyDocument() {
+  NotificationCenter::defaultCenter().removeObserver(*this);
+  for (const auto& layer : layers_) {
+    layer->removeObserversForDocument(this);
+  }
+}
+
+const PropertyTable& MyDocument::properties() const {
+  static const PropertyTable table(
+      &Object::objectProperties(),
+      {property<MyDocument>("sceneCamera", &MyDocument::sceneCamera, &MyDocument::setSceneCamera),
+       property<MyDocument>("lightSource", &MyDocument::lightSource, &MyDocument::setLightSource),
+       property<MyDocument>("selectedLayer", &MyDocument::selectedLayer,
+                            &MyDocument::setSelectedLayer),
+       property<MyDocument>("selectedCamera", &MyDocument::selectedCamera,
+                            &MyDocument::setSelectedCamera),
+       property<MyDocument>("enableViewUpdates", &MyDocument::enableViewUpdates,
+                            &MyDocument::setEnableViewUpdates)});
+  return table;
+}
+
+// --- change reporting
+
+void MyDocument::hasChanged() {
+  if (enableViewUpdates_) {
+    if (playbackView_ != nullptr) {
+      playbackView_->setNeedsDisplay();
+    } else {
+      // A copy: a view may remove itself while redrawing.
+      const std::vector<DocumentView*> views = views_;
+      for (DocumentView* view : views) {
+        view->setNeedsDisplay();
+      }
+    }
+  }
+  NotificationCenter::defaultCenter().postNotificationName(std::string(kDocumentChangeNotification),
+                                                           this);
+}
+
+void MyDocument::handleGridColorChange(const Notification&) { hasChanged(); }
+
+void MyDocument::addView(DocumentView& view) {
+  if (std::find(views_.begin(), views_.end(), &view) == views_.end()) {
+    views_.push_back(&view);
+  }
+}
+
+void MyDocument::removeView(DocumentView& view) {
+  std::erase(views_, &view);
+  if (playbackView_ == &view) {
+    playbackView_ = nullptr;
+  }
+}
+
+void MyDocument::reloadOutline() {
+  if (outlineView_ != nullptr) {
+    outlineView_->reloadData();
+  }
+}
+
+// --- the layers
+
+void MyDocument::setLayers(std::vector<std::shared_ptr<Layer>> layers) {
+  changeValueForKey("layers", layers_, std::move(layers));
+}
+
+void MyDocument::insertObjectInLayersAtIndex(std::shared_ptr<Layer> layer, int index) {
+  if (!layer || index < 0 || static_cast<std::size_t>(index) > layers_.size()) {
+    logf("insertObject:inLayersAtIndex: index %d is outside 0...%d; nothing inserted", index,
+         static_cast<int>(layers_.size()));
+    return;
+  }
+  undoManager_.registerUndoWithTarget(this,
+                                      [this, index] { removeObjectFromLayersAtIndex(index); });
+  if (!undoManager_.isUndoing()) {
+    undoManager_.setActionName("New Layer");
+  }
+  layer->addObserversForDocument(this);
+  layers_.insert(layers_.begin() + index, std::move(layer));
+  hasChanged();
+  reloadOutline();
+}
+
+void MyDocument::removeObjectFromLayersAtIndex(int index) {
+  if (index < 0 || static_cast<std::size_t>(index) >= layers_.size()) {
+    logf("removeObjectFromLayersAtIndex: index %d is outside the %d layers; nothing removed", index,
+         static_cast<int>(layers_.size()));
+    return;
+  }
+  const std::shared_ptr<Layer> layer = layers_[static_cast<std::size_t>(index)];
+  undoManager_.registerUndoWithTarget(
+      this, [this, layer, index] { insertObjectInLayersAtIndex(layer, index); });
+  if (!undoManager_.isUndoing()) {
+    undoManager_.setActionName("Remove Layer");
+  }
+  layer->removeObserversForDocument(this);
+  layers_.erase(layers_.begin() + index);
+  hasChanged();
+  reloadOutline();
+}
+
+void MyDocument::addLayer(std::shared_ptr<Layer> layer) {
+  if (!layer) {
+    return;
+  }
+  willChangeValueForKey("layers");
+  insertObjectInLayersAtIndex(layer, static_cast<int>(layers_.size()));
+  didChangeValueForKey("layers");
+  setSelectedLayer(layer);
+}
+
+// --- selection
+
+void MyDocument::setSelectedLayer(const std::shared_ptr<Layer>& layer) {
+  if (const auto old = selectedLayer_.lock()) {
+    old->sendDeselectNotification();
+  }
+  willChangeValueForKey("selectedLayer");
+  selectedLayer_ = layer;
+  didChangeValueForKey("selectedLayer");
+  if (layer) {
+    layer->sendSelectNotification();
+  }
+  hasChanged();
+}
+
+void MyDocument::setSelectedCamera(const std::shared_ptr<Camera>& camera) {
+  willChangeValueForKey("selectedCamera");
+  selectedCamera_ = camera;
+  didChangeValueForKey("selectedCamera");
+}
+
+void MyDocument::setSceneCamera(std::shared_ptr<SceneCamera> camera) {
+  changeValueForKey("sceneCamera", sceneCamera_, std::move(camera));
+}
+
+void MyDocument::setLightSource(std::shared_ptr<LightSource> light) {
+  changeValueForKey("lightSource", lightSource_, std::move(light));
+}
+
+// --- generic undoable property changes
+
+void MyDocument::observeValueForKeyPathOfObjectChangeContext(std::string_view keyPath,
+                                                             Object& object, const Change& change,
+                                                             std::string_view context) {
+  // The step holds the object, as it holds the old value.
+  const ObjectPtr target = object.weak_from_this().lock();
+  if (!target) {
+    logf("%s is not shared-owned; its change of \"%s\" cannot be undone",
+         std::string(object.className()), std::string(keyPath));
+    return;
+  }
+  undoManager_.registerUndoWithTarget(
+      this, [this, path = std::string(keyPath), target, old = change.oldValue.value_or(Value{})] {
+        changeKeyPathOfObjectToValue(path, *target, old);
+      });
+  undoManager_.setActionName(std::string(context));
+}
+
+void MyDocument::changeKeyPathOfObjectToValue(std::string_view keyPath, Object& object,
+                                              const Value& value) {
+  object.setValueForKeyPath(value, keyPath);
+  hasChanged();
+}
+
+// --- the layer outline's data source
+
+int MyDocument::outlineViewNumberOfChildrenOfItem(const Layer* item) const {
+  return item == nullptr ? static_cast<int>(layers_.size()) : item->childLayerCount();
+}
+
+bool MyDocument::outlineViewIsItemExpandable(const Layer* item) const {
+  return (outlineViewNumberOfChildrenOfItem(item) & 0xff) != 0;
+}
+
+std::shared_ptr<Layer> MyDocument::outlineViewChildOfItem(int index, const Layer* item) const {
+  const auto& children = item == nullptr ? layers_ : item->childLayers();
+  if (index < 0 || static_cast<std::size_t>(index) >= children.size()) {
+    return nullptr;
+  }
+  return children[static_cast<std::size_t>(index)];
+}
+
+Value MyDocument::outlineViewObjectValueForTableColumnByItem(std::string_view column,
+                                                             const Layer* item) const {
+  return item != nullptr ? item->valueForKey(column) : Value{};
+}
+
+void MyDocument::outlineViewSetObjectValueForTableColumnByItem(const Value& value,
+                                                               std::string_view column,
+                                                               Layer* item) {
+  if (item == nullptr) {
+    return;
+  }
+  item->setValueForKey(value, column);
+  hasChanged();
+}
+
+}  // namespace cloudreel
