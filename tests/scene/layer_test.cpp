@@ -2,8 +2,68 @@
 
 #include <gtest/gtest.h>
 
+#include <cmath>
+#include <functional>
+#include <limits>
+
+#include "platform/class_registry.h"
+#include "platform/keyed_archiver.h"
+#include "platform/keyed_unarchiver.h"
+#include "scene/core_classes.h"
+#include "scene/light_source.h"
+
 namespace cloudreel {
 namespace {
+
+// Archives a stand-in that writes only what `write` writes under the class
+// name `className`, and reads it back as the real class.
+template <class T>
+std::shared_ptr<T> decodeFrom(std::string_view className,
+                              std::function<void(KeyedArchiver&)> write) {
+  class Partial : public Object {
+   public:
+    Partial(std::string_view name, std::function<void(KeyedArchiver&)> w)
+        : name_(name), write_(std::move(w)) {}
+    std::string_view className() const override { return name_; }
+    void encodeWithCoder(KeyedArchiver& coder) const override { write_(coder); }
+
+   private:
+    std::string_view name_;
+    std::function<void(KeyedArchiver&)> write_;
+  };
+  registerCoreClasses(ClassRegistry::shared());
+  const Bytes data =
+      KeyedArchiver::archivedDataWithRootObject(std::make_shared<Partial>(className, write));
+  Error error;
+  auto object = KeyedUnarchiver::unarchiveObjectWithData(data, &error);
+  EXPECT_TRUE(object) << error.message;
+  return std::dynamic_pointer_cast<T>(object);
+}
+
+template <class T>
+std::shared_ptr<T> roundTrip(const std::shared_ptr<T>& object) {
+  registerCoreClasses(ClassRegistry::shared());
+  Error error;
+  auto decoded = KeyedUnarchiver::unarchiveObjectWithData(
+      KeyedArchiver::archivedDataWithRootObject(object), &error);
+  EXPECT_TRUE(decoded) << error.message;
+  return std::dynamic_pointer_cast<T>(decoded);
+}
+
+TEST(Layer, BillboardDistanceIsNeverNegative) {
+  const struct {
+    float set, stored;
+  } cases[] = {{-2.0f, 0.0f}, {3.5f, 3.5f}, {0.0f, 0.0f},
+               {std::numeric_limits<float>::quiet_NaN(), 0.0f}};
+  for (const auto& c : cases) {
+    Layer layer;
+    layer.setBillboardDistance(c.set);
+    EXPECT_EQ(layer.billboardDistance(), c.stored) << c.set;
+    // The same through key-value coding, as the property panel sets it.
+    layer.setValueForKey(static_cast<double>(c.set), "billboardDistance");
+    EXPECT_EQ(layer.billboardDistance(), c.stored) << c.set;
+  }
+}
 
 TEST(Layer, CopyAppendsToTheNameSharesChildrenAndLeavesEditingStateBehind) {
   auto child = std::make_shared<Layer>();
@@ -12,19 +72,128 @@ TEST(Layer, CopyAppendsToTheNameSharesChildrenAndLeavesEditingStateBehind) {
   cloud.addChildLayer(child);
   cloud.setIsModified(true);
   cloud.setIsEditing(true);
+  cloud.setBillboardDistance(4.0f);
+  cloud.setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(1, 2, 3, 4, 5, 6);
   cloud.editingTransform()->setTranslation({1, 2, 3});
   cloud.objectToWorld()->setTranslation({4, 5, 6});
 
   const auto copy = copyOf(cloud);
-  EXPECT_EQ(copy->className(), "Layer");
   EXPECT_EQ(copy->name(), "Cloud copy");
   ASSERT_EQ(copy->childLayerCount(), 1);
   EXPECT_EQ(copy->childLayers()[0], child);
   EXPECT_FALSE(copy->isModified());
   EXPECT_FALSE(copy->isEditing());
+  EXPECT_EQ(copy->billboardDistance(), 4.0f);
+  EXPECT_EQ(copy->bbox(), cloud.bbox());
   EXPECT_EQ(copy->editingTransform()->mx(), AffineTransform::kIdentity);
   EXPECT_EQ(copy->objectToWorld()->mx(), cloud.objectToWorld()->mx());
   EXPECT_NE(copy->objectToWorld(), cloud.objectToWorld());
+
+  // Adding to the copy's list leaves the original's alone.
+  copy->addChildLayer(std::make_shared<Layer>());
+  EXPECT_EQ(cloud.childLayerCount(), 1);
+}
+
+TEST(Layer, CopiesAreOfTheOriginalsClass) {
+  AnimatedLayer animated;
+  animated.setFPS(12);
+  animated.setNFrames(48);
+  const auto copy = copyOf(animated);
+  EXPECT_EQ(copy->className(), "AnimatedLayer");
+  EXPECT_EQ(copy->FPS(), 12);
+  EXPECT_EQ(copy->nFrames(), 48);
+  EXPECT_EQ(copyOf(LightSource())->className(), "LightSource");
+}
+
+TEST(LayerArchive, WritesTheBoxInItsOwnOrder) {
+  auto layer = std::make_shared<Layer>();
+  layer->setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(1, 2, 3, 4, 5, 6);
+  EXPECT_EQ(layer->bbox(), (Layer::BoundingBox{1, 3, 5, 2, 4, 6}));
+
+  // Read the written keys back through a class that records them.
+  struct Probe : Object {
+    std::string_view className() const override { return "Layer"; }
+    void initWithCoder(KeyedUnarchiver& coder) override {
+      for (std::size_t i = 0; i < 6; ++i) {
+        box[i] = coder.decodeDoubleForKey("bbox0" + std::to_string(i));
+      }
+      keys = coder.allKeys();
+    }
+    Layer::BoundingBox box{};
+    std::vector<std::string> keys;
+  };
+  ClassRegistry registry;
+  registerCoreClasses(registry);
+  registry.registerClass<Probe>("Layer");
+  Error error;
+  const auto probe = std::dynamic_pointer_cast<Probe>(KeyedUnarchiver::unarchiveObjectWithData(
+      KeyedArchiver::archivedDataWithRootObject(layer), &error, registry));
+  ASSERT_TRUE(probe) << error.message;
+  EXPECT_EQ(probe->box, (Layer::BoundingBox{1, 3, 5, 2, 4, 6}));
+  EXPECT_EQ(probe->keys, (std::vector<std::string>{
+                             "animate", "animationPath", "bbox00", "bbox01", "bbox02", "bbox03",
+                             "bbox04", "bbox05", "billboardDistance", "childLayers", "enableFog",
+                             "inertialToObject", "isInWorld", "isVisible", "layerName",
+                             "objectToWorld"}));
+}
+
+TEST(LayerArchive, RoundTripsTheTreeAndItsSettings) {
+  auto root = std::make_shared<AnimatedLayer>();
+  root->setName("Root");
+  root->setIsVisible(false);
+  root->setIsInWorld(false);
+  root->setAnimate(true);
+  root->setAnimationPath(3);
+  root->setBillboardDistance(2.5f);
+  root->setEnableFog(true);
+  root->setNFrames(90);
+  root->setFPS(30);
+  root->setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(-1, 1, -2, 2, -3, 3);
+  root->objectToWorld()->setTranslation({1, 2, 3});
+  root->inertialToObject()->setToScale(2);
+  root->editingTransform()->setTranslation({9, 9, 9});  // pending edits are not saved
+  auto child = std::make_shared<Layer>();
+  child->setName("Child");
+  root->addChildLayer(child);
+  root->addChildLayer(child);  // the same child twice comes back as one object
+
+  const auto decoded = roundTrip(root);
+  ASSERT_TRUE(decoded);
+  EXPECT_EQ(decoded->name(), "Root");
+  EXPECT_FALSE(decoded->isVisible());
+  EXPECT_FALSE(decoded->isInWorld());
+  EXPECT_TRUE(decoded->animate());
+  EXPECT_EQ(decoded->animationPath(), 3);
+  EXPECT_EQ(decoded->billboardDistance(), 2.5f);
+  EXPECT_TRUE(decoded->enableFog());
+  EXPECT_EQ(decoded->nFrames(), 90);
+  EXPECT_EQ(decoded->FPS(), 30);
+  EXPECT_EQ(decoded->bbox(), root->bbox());
+  EXPECT_EQ(decoded->objectToWorld()->mx(), root->objectToWorld()->mx());
+  EXPECT_EQ(decoded->inertialToObject()->mx(), root->inertialToObject()->mx());
+  EXPECT_EQ(decoded->editingTransform()->mx(), AffineTransform::kIdentity);
+  ASSERT_EQ(decoded->childLayerCount(), 2);
+  EXPECT_EQ(decoded->childLayers()[0]->name(), "Child");
+  EXPECT_EQ(decoded->childLayers()[0], decoded->childLayers()[1]);
+}
+
+TEST(LayerArchive, MissingKeysReadAsZeroNoAndNothing) {
+  const auto layer = decodeFrom<AnimatedLayer>("AnimatedLayer", [](KeyedArchiver&) {});
+  ASSERT_TRUE(layer);
+  EXPECT_EQ(layer->name(), "");
+  EXPECT_FALSE(layer->isVisible());
+  EXPECT_FALSE(layer->isInWorld());
+  EXPECT_EQ(layer->billboardDistance(), 0.0f);
+  EXPECT_EQ(layer->childLayerCount(), 0);
+  EXPECT_EQ(layer->FPS(), 0);  // not the 25 of a new layer
+  EXPECT_EQ(layer->objectToWorld()->mx(), AffineTransform::kIdentity);
+  EXPECT_EQ(layer->inertialToObject()->mx(), AffineTransform::kIdentity);
+
+  // A stored billboard distance is taken as it stands, unclamped.
+  const auto billboard = decodeFrom<Layer>(
+      "Layer", [](KeyedArchiver& coder) { coder.encodeFloat(-2.0f, "billboardDistance"); });
+  ASSERT_TRUE(billboard);
+  EXPECT_EQ(billboard->billboardDistance(), -2.0f);
 }
 
 }  // namespace

@@ -1,0 +1,154 @@
+#include "scene/animatable_3d_object.h"
+
+#include <gtest/gtest.h>
+
+#include "platform/class_registry.h"
+#include "platform/keyed_archiver.h"
+#include "platform/keyed_unarchiver.h"
+#include "scene/core_classes.h"
+#include "scene/layer.h"
+#include "scene/my_document.h"
+
+namespace cloudreel {
+namespace {
+
+// A document with one attached layer, and the end of each simulated user
+// event.
+struct Scene {
+  MyDocument document;
+  std::shared_ptr<Layer> layer = std::make_shared<Layer>();
+  Scene() {
+    document.addLayer(layer);
+    endEvent();
+    document.undoManager().removeAllActions();
+  }
+  void endEvent() { document.undoManager().closeEventGroup(); }
+  UndoManager& undo() { return document.undoManager(); }
+};
+
+TEST(TransformUndo, EachPlacingTransformEditIsOneNamedStep) {
+  const struct {
+    const char* keyPath;
+    double value;
+    const char* actionName;
+  } cases[] = {
+      {"objectToWorld.scale", 2.0, "Scale"},
+      {"objectToWorld.translationY", 4.0, "Translate"},
+      {"inertialToObject.translationX", -1.5, "Translate"},
+      {"inertialToObject.scale", 0.5, "Scale"},
+  };
+  for (const auto& c : cases) {
+    Scene scene;
+    const Value before = scene.layer->valueForKeyPath(c.keyPath);
+    scene.layer->setValueForKeyPath(c.value, c.keyPath);
+    scene.endEvent();
+    EXPECT_EQ(scene.undo().undoActionName(), c.actionName) << c.keyPath;
+
+    scene.undo().undo();
+    EXPECT_EQ(scene.layer->valueForKeyPath(c.keyPath), before) << c.keyPath;
+    EXPECT_FALSE(scene.undo().canUndo()) << c.keyPath;
+    EXPECT_EQ(scene.undo().redoActionName(), c.actionName) << c.keyPath;
+
+    scene.undo().redo();
+    EXPECT_EQ(numberAs<double>(scene.layer->valueForKeyPath(c.keyPath)), c.value) << c.keyPath;
+  }
+}
+
+TEST(TransformUndo, ScaleUndoRestoresTheWholeMatrix) {
+  Scene scene;
+  scene.layer->objectToWorld()->setTranslation({1, 2, 3});
+  const auto before = scene.layer->objectToWorld()->mx();
+  scene.layer->setValueForKeyPath(3.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_NE(scene.layer->objectToWorld()->mx(), before);
+  scene.undo().undo();
+  for (std::size_t i = 0; i < 16; ++i) {
+    EXPECT_NEAR(scene.layer->objectToWorld()->mx()[i], before[i], 1e-6) << i;
+  }
+}
+
+TEST(TransformUndo, ADetachedObjectRegistersNothing) {
+  Scene scene;
+  scene.document.removeObjectFromLayersAtIndex(0);
+  scene.endEvent();
+  scene.undo().removeAllActions();
+  scene.layer->setValueForKeyPath(2.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_FALSE(scene.undo().canUndo());
+  EXPECT_EQ(scene.layer->objectToWorld()->scale(), 2.0f);
+}
+
+TEST(TransformUndo, CommittingAnEditIsOneStepBackToThePlacementBeforeIt) {
+  Scene scene;
+  scene.layer->objectToWorld()->setTranslation({1, 0, 0});
+  const auto placedBefore = scene.layer->objectToWorld()->mx();
+  const auto orientedBefore = scene.layer->inertialToObject()->mx();
+
+  // A drag: a move and a turn accumulate in the editing transforms.
+  scene.layer->editingTransform()->setTranslation({0, 5, 0});
+  scene.layer->editingOrigin()->setAxisAngleRotation({1.0, 0, 0, 1});
+  scene.layer->applyEditingTransformNamed("Drag");
+  scene.endEvent();
+
+  EXPECT_EQ(scene.layer->editingTransform()->mx(), AffineTransform::kIdentity);
+  EXPECT_EQ(scene.layer->editingOrigin()->mx(), AffineTransform::kIdentity);
+  std::array<double, 3> t{};
+  scene.layer->objectToWorld()->getTranslation(t);
+  EXPECT_EQ(t, (std::array<double, 3>{1, 5, 0}));
+  EXPECT_NE(scene.layer->inertialToObject()->mx(), orientedBefore);
+  EXPECT_EQ(scene.undo().undoActionName(), "Drag");
+
+  scene.undo().undo();
+  EXPECT_EQ(scene.layer->objectToWorld()->mx(), placedBefore);
+  EXPECT_EQ(scene.layer->inertialToObject()->mx(), orientedBefore);
+  EXPECT_FALSE(scene.undo().canUndo());
+
+  // The redo puts the committed placement back, and the transforms the undo
+  // installed are observed: an edit of them is undoable again.
+  scene.undo().redo();
+  scene.layer->objectToWorld()->getTranslation(t);
+  EXPECT_EQ(t, (std::array<double, 3>{1, 5, 0}));
+  scene.layer->setValueForKeyPath(2.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_EQ(scene.undo().undoActionName(), "Scale");
+}
+
+TEST(TransformUndo, DecodedTransformsAreNotObservedUntilReplaced) {
+  registerCoreClasses(ClassRegistry::shared());
+  Scene scene;
+  Error error;
+  auto decoded = std::dynamic_pointer_cast<Layer>(KeyedUnarchiver::unarchiveObjectWithData(
+      KeyedArchiver::archivedDataWithRootObject(std::make_shared<Layer>()), &error));
+  ASSERT_TRUE(decoded) << error.message;
+  scene.document.addLayer(decoded);
+  scene.endEvent();
+  scene.undo().removeAllActions();
+
+  decoded->setValueForKeyPath(2.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_FALSE(scene.undo().canUndo());
+
+  decoded->setObjectToWorldInertialToObject(std::make_shared<AffineTransform>(),
+                                            std::make_shared<AffineTransform>());
+  scene.endEvent();
+  scene.undo().removeAllActions();
+  decoded->setValueForKeyPath(2.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_EQ(scene.undo().undoActionName(), "Scale");
+  // Teardown with the document still attached is safe (the scene goes
+  // first, then the decoded layer).
+}
+
+TEST(TransformUndo, ACopyDoesNotObserveItsCopiedTransforms) {
+  Scene scene;
+  auto copy = copyOf(*scene.layer);
+  scene.document.addLayer(copy);
+  scene.endEvent();
+  scene.undo().removeAllActions();
+  copy->setValueForKeyPath(2.0, "objectToWorld.scale");
+  scene.endEvent();
+  EXPECT_FALSE(scene.undo().canUndo());
+}
+
+}  // namespace
+}  // namespace cloudreel
