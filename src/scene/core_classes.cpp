@@ -1,6 +1,7 @@
 #include "scene/core_classes.h"
 
 #include "camera/camera.h"
+#include "camera/rw_trackball.h"
 #include "camera/scene_camera.h"
 #include "geometry/geometry_classes.h"
 #include "platform/class_registry.h"
@@ -16,6 +17,7 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<LightSource>("LightSource");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
+  registry.registerClass<RWTrackball>("RWTrackball");
 }
 
 }  // namespace cloudreel
