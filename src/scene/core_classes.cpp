@@ -7,6 +7,8 @@
 #include "platform/class_registry.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
+#include "scene/point_3d.h"
+#include "scene/sphere.h"
 
 namespace cloudreel {
 
@@ -15,6 +17,8 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<Layer>("Layer");
   registry.registerClass<AnimatedLayer>("AnimatedLayer");
   registry.registerClass<LightSource>("LightSource");
+  registry.registerClass<Sphere>("Sphere");
+  registry.registerClass<Point3D>("Point3D");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
   registry.registerClass<RWTrackball>("RWTrackball");
