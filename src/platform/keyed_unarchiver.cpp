@@ -739,6 +739,16 @@ std::optional<std::size_t> KeyedUnarchiver::bytesLengthForKey(std::string_view k
 
 bool KeyedUnarchiver::decodeBytesForKeyInto(std::string_view key,
                                             std::span<std::uint8_t> destination) {
+  return decodeBytesInto(key, destination, false);
+}
+
+bool KeyedUnarchiver::decodeLeadingBytesForKeyInto(std::string_view key,
+                                                   std::span<std::uint8_t> destination) {
+  return decodeBytesInto(key, destination, true);
+}
+
+bool KeyedUnarchiver::decodeBytesInto(std::string_view key, std::span<std::uint8_t> destination,
+                                      bool leadingOnly) {
   const Node* node = failed_ ? nullptr : find(key);
   if (node == nullptr || node->type == ArchiveValueType::Null) {
     return false;
@@ -747,7 +757,9 @@ bool KeyedUnarchiver::decodeBytesForKeyInto(std::string_view key,
     failWrongType(key, "bytes");
     return false;
   }
-  if (node->length != destination.size()) {
+  const bool fits =
+      leadingOnly ? node->length >= destination.size() : node->length == destination.size();
+  if (!fits) {
     failWithError(makeArchiveError(ArchiveError::WrongType,
                                    "the key \"" + std::string(key) + "\" of " + where() +
                                        " holds " + std::to_string(node->length) +
@@ -755,7 +767,9 @@ bool KeyedUnarchiver::decodeBytesForKeyInto(std::string_view key,
                                        " asked for"));
     return false;
   }
-  return readBytes(*node, destination.data());
+  Node leading = *node;
+  leading.length = destination.size();
+  return readBytes(leading, destination.data());
 }
 
 ObjectPtr KeyedUnarchiver::objectAt(std::size_t index) {

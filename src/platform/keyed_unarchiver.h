@@ -82,6 +82,9 @@ class KeyedUnarchiver {
   // Reads a byte string whose length equals destination.size(); a missing
   // key answers NO, a wrong kind or a length that differs fails the decode.
   bool decodeBytesForKeyInto(std::string_view key, std::span<std::uint8_t> destination);
+  // The same for the first destination.size() bytes of a byte string at
+  // least that long.
+  bool decodeLeadingBytesForKeyInto(std::string_view key, std::span<std::uint8_t> destination);
 
   ObjectPtr decodeObjectForKey(std::string_view key);
   // An object of another class fails the decode.
@@ -135,6 +138,8 @@ class KeyedUnarchiver {
   ObjectPtr objectAt(std::size_t index);
   ObjectPtr objectOrNull(const std::optional<std::size_t>& reference);
   bool readBytes(const Node& node, std::uint8_t* destination);
+  bool decodeBytesInto(std::string_view key, std::span<std::uint8_t> destination,
+                       bool leadingOnly);
   void failWrongType(std::string_view key, const char* asked);
   // An integer of type I under the key; a value outside I's range fails.
   template <typename I>
