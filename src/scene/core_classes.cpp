@@ -8,6 +8,7 @@
 #include "scene/layer.h"
 #include "scene/light_source.h"
 #include "scene/point_3d.h"
+#include "scene/point_layer.h"
 #include "scene/sphere.h"
 
 namespace cloudreel {
@@ -19,6 +20,7 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<LightSource>("LightSource");
   registry.registerClass<Sphere>("Sphere");
   registry.registerClass<Point3D>("Point3D");
+  registry.registerClass<PointLayer>("PointLayer");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
   registry.registerClass<RWTrackball>("RWTrackball");

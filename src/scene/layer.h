@@ -59,6 +59,7 @@ class Layer : public Animatable3DObject {
   void setIsModified(bool v) { changeValueForKey("isModified", isModified_, v); }
   // The arguments come min, max per axis, as floats; bbox() holds them in
   // its own order as doubles.
+  void setBoundingBox(const BoundingBox& box) { bbox_ = box; }
   void setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(float minX, float maxX, float minY, float maxY,
                                                   float minZ, float maxZ);
 

@@ -1,0 +1,315 @@
+#include "scene/point_layer.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <fstream>
+#include <iterator>
+
+#include "platform/application_defaults.h"
+#include "platform/class_registry.h"
+#include "platform/keyed_archiver.h"
+#include "platform/keyed_unarchiver.h"
+#include "platform/user_defaults.h"
+#include "scene/core_classes.h"
+#include "scene/my_document.h"
+#include "support/scripted_user_interaction.h"
+#include "support/temp_dir.h"
+
+namespace cloudreel {
+namespace {
+
+using Bytes = std::vector<std::uint8_t>;
+
+Bytes readAll(const std::filesystem::path& path) {
+  std::ifstream in(path, std::ios::binary);
+  return Bytes(std::istreambuf_iterator<char>(in), {});
+}
+
+void writeAll(const std::filesystem::path& path, const Bytes& bytes) {
+  std::ofstream(path, std::ios::binary)
+      .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+}
+
+// Application defaults in memory, the point cache in a temporary folder and
+// a scripted user, for the length of a test.
+class PointLayerTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
+    registerApplicationDefaults(*defaults);
+    std::filesystem::create_directory(dir / "cache");
+    defaults->setObjectForKey((dir / "cache").string(), kPointCachePathKey);
+    previousDefaults_ = UserDefaults::setStandardUserDefaults(std::move(defaults));
+    previousUser_ = UserInteraction::setShared(user);
+    registerCoreClasses(ClassRegistry::shared());
+  }
+  void TearDown() override {
+    UserDefaults::setStandardUserDefaults(std::move(previousDefaults_));
+    UserInteraction::setShared(previousUser_);
+  }
+
+  // A layer of `n` points with distinct positions, colours and luck.
+  static std::shared_ptr<PointLayer> layerOf(int n) {
+    auto layer = std::make_shared<PointLayer>();
+    layer->allocatePointArrayWithSize(n);
+    layer->setNPoints(n);
+    int i = 0;
+    for (color_point& p : layer->colorPoints()) {
+      p = {float(i), float(2 * i), float(-i), std::uint8_t(i), std::uint8_t(i + 1),
+           std::uint8_t(i + 2), std::uint8_t(7 * i)};
+      ++i;
+    }
+    layer->setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(0, float(n), 0, float(2 * n), float(-n), 0);
+    return layer;
+  }
+  static Bytes recordsOf(const PointLayer& layer) {
+    return Bytes(layer.points(), layer.points() + layer.byteSize());
+  }
+  std::filesystem::path saved(const PointLayer& layer, std::string name = "cloud.rwb") {
+    Error error;
+    EXPECT_FALSE(layer.savePointsToURLError(dir / name, &error)) << error.message;
+    return dir / name;
+  }
+
+  testing::TempDir dir;
+  std::shared_ptr<testing::ScriptedUserInteraction> user =
+      std::make_shared<testing::ScriptedUserInteraction>();
+
+ private:
+  std::unique_ptr<UserDefaults> previousDefaults_;
+  std::shared_ptr<UserInteraction> previousUser_;
+};
+
+TEST_F(PointLayerTest, ThreePointsMakeA136ByteFileThatReadsBackTheSame) {
+  const auto layer = layerOf(3);
+  const Bytes file = readAll(saved(*layer));
+  ASSERT_EQ(file.size(), 136u);
+  EXPECT_EQ(std::memcmp(file.data(), "RWBP\0\0\0\0\0\0\0\0\3\0\0\0", 16), 0);
+  EXPECT_EQ(std::memcmp(file.data() + 88, layer->points(), 48), 0);
+
+  PointLayer loaded;
+  Error error;
+  EXPECT_FALSE(loaded.loadPointsFromURLError(dir / "cloud.rwb", &error));
+  EXPECT_EQ(error.message, "");
+  EXPECT_EQ(loaded.nPoints(), 3);
+  EXPECT_EQ(recordsOf(loaded), recordsOf(*layer));
+  EXPECT_EQ(loaded.bbox(), layer->bbox());
+  EXPECT_EQ(loaded.byteSize(), 48u);
+}
+
+TEST_F(PointLayerTest, BadFilesAreRefusedWithTheirMessageAndNothingHostileIsAllocated) {
+  const Bytes good = readAll(saved(*layerOf(3)));
+  const auto patched = [&](std::size_t offset, std::uint32_t value) {
+    Bytes b = good;
+    std::memcpy(b.data() + offset, &value, 4);
+    return b;
+  };
+  const struct {
+    const char* what;
+    Bytes file;
+    const char* message;
+    int pointsAfter;  // -1: the layer keeps its own
+  } cases[] = {
+      {"version 1", patched(4, 1), "Unsupported RWB file version", -1},
+      {"big-endian writer", patched(8, 0x01000000), "Wrong file endianness", -1},
+      {"wrong magic", patched(0, 0x58585858), "Not a RWB file", -1},
+      {"short header", Bytes(good.begin(), good.begin() + 39), "File is corrupt: short read", -1},
+      {"cut in the box", Bytes(good.begin(), good.begin() + 60), "Cannot read bounding box", 0},
+      {"cut in the records", Bytes(good.begin(), good.begin() + 88 + 40),
+       "Cannot read points: short read", 2},
+      {"a count of 2^32 - 1", patched(12, 0xffffffff), "Cannot read points: short read", 3},
+  };
+  for (const auto& c : cases) {
+    writeAll(dir / "bad.rwb", c.file);
+    const auto layer = layerOf(5);
+    const Bytes before = recordsOf(*layer);
+    Error error;
+    // The result says success for a short read; only the error tells.
+    layer->loadPointsFromURLError(dir / "bad.rwb", &error);
+    EXPECT_EQ(error.domain, "myDomain") << c.what;
+    EXPECT_EQ(error.code, 100) << c.what;
+    EXPECT_EQ(error.message, c.message) << c.what;
+    if (c.pointsAfter < 0) {
+      EXPECT_EQ(recordsOf(*layer), before) << c.what;
+    } else {
+      EXPECT_EQ(layer->nPoints(), c.pointsAfter) << c.what;
+    }
+  }
+}
+
+TEST_F(PointLayerTest, TheNormalsFlagSelects28ByteRecords) {
+  Bytes file(88 + 2 * 28, 0);
+  std::memcpy(file.data(), "RWBP", 4);
+  file[12] = 2;
+  file[24] = 1;
+  for (int i = 0; i < 2; ++i) {
+    const color_point_with_normal p{1.0f + i, 2, 3, 0, 0, 1, 10, 20, 30, std::uint8_t(i)};
+    std::memcpy(file.data() + 88 + 28 * i, &p, 28);
+  }
+  writeAll(dir / "normals.rwb", file);
+  PointLayer layer;
+  Error error;
+  layer.loadPointsFromURLError(dir / "normals.rwb", &error);
+  EXPECT_EQ(error.message, "");
+  EXPECT_TRUE(layer.hasNormalsField());
+  EXPECT_FALSE(layer.hasNormals());
+  ASSERT_EQ(layer.nPoints(), 2);
+  EXPECT_EQ(layer.pointArray()->size(), 56u);
+  EXPECT_EQ(std::memcmp(layer.points(), file.data() + 88, 56), 0);
+}
+
+TEST_F(PointLayerTest, AMissingFileIsTakenFromTheCacheOrLocatedByTheUser) {
+  const auto layer = layerOf(4);
+  saved(*layer, "cache/cached.rwb");
+  auto fromCache = PointLayer::initWithURLShouldLink(dir / "elsewhere/cached.rwb", true);
+  ASSERT_TRUE(fromCache);
+  EXPECT_EQ(fromCache->name(), "cached.rwb");
+  EXPECT_EQ(recordsOf(*fromCache), recordsOf(*layer));
+  EXPECT_TRUE(user->panels.empty());
+
+  const auto located = saved(*layer, "located.rwb");
+  user->answerOpenPanelWith(located.string());
+  auto found = PointLayer::initWithURLShouldLink(dir / "lost.rwb", true);
+  ASSERT_TRUE(found);
+  ASSERT_EQ(user->panels.size(), 1u);
+  EXPECT_EQ(user->panels[0].title, "Please locate lost.rwb");
+  EXPECT_EQ(found->originalURL(), dir / "lost.rwb");  // not the located file
+
+  EXPECT_FALSE(PointLayer::initWithURLShouldLink(dir / "lost.rwb", true));  // cancelled
+  ASSERT_EQ(user->errors.size(), 1u);
+  EXPECT_EQ(user->errors[0].message, "Cannot open file");
+}
+
+TEST_F(PointLayerTest, InlineLayersTravelInTheArchiveLinkedOnesReloadTheirFile) {
+  const auto inlineLayer = layerOf(6);
+  inlineLayer->setPointSize(3.5f);
+  inlineLayer->setBucketLimit(0.25f);
+  inlineLayer->setOpacity(0.3f);
+  inlineLayer->setColorMode(1);
+  const auto decode = [](const std::shared_ptr<PointLayer>& layer) {
+    Error error;
+    auto object = KeyedUnarchiver::unarchiveObjectWithData(
+        KeyedArchiver::archivedDataWithRootObject(layer), &error);
+    EXPECT_TRUE(object) << error.message;
+    return std::dynamic_pointer_cast<PointLayer>(object);
+  };
+  const auto back = decode(inlineLayer);
+  ASSERT_TRUE(back);
+  EXPECT_EQ(recordsOf(*back), recordsOf(*inlineLayer));
+  EXPECT_EQ(back->pointSize(), 3.5f);
+  EXPECT_EQ(back->bucketLimit(), 0.25f);
+  EXPECT_EQ(back->opacity(), 1.0f);  // opacity and colour mode are not saved
+  EXPECT_EQ(back->colorMode(), 0);
+
+  const auto linked = PointLayer::initWithURLShouldLink(saved(*layerOf(1000), "linked.rwb"), true);
+  ASSERT_TRUE(linked);
+  const Bytes archive = KeyedArchiver::archivedDataWithRootObject(linked);
+  EXPECT_LT(archive.size(), 2000u);  // only the file's location travels, not 16,000 bytes
+  const auto reloaded = decode(linked);
+  ASSERT_TRUE(reloaded);
+  EXPECT_EQ(recordsOf(*reloaded), recordsOf(*layerOf(1000)));
+
+  // A linked file gone from everywhere fails the decode, after telling the
+  // user.
+  std::filesystem::remove(dir / "linked.rwb");
+  Error error;
+  EXPECT_FALSE(KeyedUnarchiver::unarchiveObjectWithData(archive, &error));
+  EXPECT_EQ(user->errors.back().message, "Cannot open file");
+}
+
+TEST_F(PointLayerTest, OlderDocumentsAndDamagedCountsReadSafely) {
+  // An archive of an old layer: no bucket limit, no attenuation, and a
+  // point count larger than its blob.
+  struct OldLayer : Object {
+    std::string_view className() const override { return "PointLayer"; }
+    void encodeWithCoder(KeyedArchiver& coder) const override {
+      coder.encodeInt32(1000000, "nPoints");
+      coder.encodeBytes(Bytes(40, 7), "points");
+    }
+  };
+  Error error;
+  const auto layer = std::dynamic_pointer_cast<PointLayer>(KeyedUnarchiver::unarchiveObjectWithData(
+      KeyedArchiver::archivedDataWithRootObject(std::make_shared<OldLayer>()), &error));
+  ASSERT_TRUE(layer) << error.message;
+  EXPECT_EQ(layer->bucketLimit(), 1.0f);
+  EXPECT_FALSE(layer->attenuatePoints());
+  EXPECT_EQ(layer->atten_c(), 1.0f);
+  EXPECT_EQ(layer->nPoints(), 2);  // the whole records the blob holds
+  EXPECT_EQ(recordsOf(*layer), Bytes(32, 7));
+}
+
+TEST_F(PointLayerTest, CopiesShareTheRecordsAndDrawAsAPlainCloud) {
+  const auto layer = layerOf(10);
+  layer->setName("Scan");
+  layer->setColorMode(1);
+  layer->setOpacity(0.5f);
+  const auto copy = copyOf(*layer);
+  EXPECT_EQ(copy->className(), "PointLayer");
+  EXPECT_EQ(copy->name(), "Scan copy");
+  EXPECT_EQ(copy->pointArray(), layer->pointArray());
+  EXPECT_EQ(copy->nPoints(), 10);
+  EXPECT_EQ(copy->colorMode(), 0);
+  EXPECT_EQ(copy->opacity(), 1.0f);
+  // The records outlive the original.
+  const Bytes records = recordsOf(*layer);
+  std::weak_ptr<PointArray> array = layer->pointArray();
+  layer->allocatePointArrayWithSize(1);
+  EXPECT_EQ(recordsOf(*copy), records);
+  copy->allocatePointArrayWithSize(1);
+  EXPECT_TRUE(array.expired());
+}
+
+TEST_F(PointLayerTest, ReRandomizingRewritesOnlyTheLuck) {
+  const auto layer = layerOf(2000);
+  const Bytes before = recordsOf(*layer);
+  layer->reRandomizeWithExponent(1.0f);
+  int highest = 0;
+  int distinct = 0;
+  std::array<bool, 256> seen{};
+  for (std::size_t i = 0; i < 2000; ++i) {
+    const color_point& p = layer->colorPoints()[i];
+    EXPECT_EQ(std::memcmp(&p, before.data() + 16 * i, 15), 0);
+    highest = std::max<int>(highest, p.luck);
+    distinct += seen[p.luck] ? 0 : 1;
+    seen[p.luck] = true;
+  }
+  EXPECT_LE(highest, 254);
+  EXPECT_GT(distinct, 200);
+  layer->reRandomizeWithExponent(0.0f);
+  for (const color_point& p : layer->colorPoints()) {
+    ASSERT_EQ(p.luck, 255);
+  }
+}
+
+TEST_F(PointLayerTest, SavingBackNeedsALinkAndClearsTheModifiedMark) {
+  const auto inlineLayer = layerOf(3);
+  inlineLayer->saveLinkedLayer();
+  ASSERT_EQ(user->alerts.size(), 1u);
+  EXPECT_EQ(user->alerts[0].messageText, "Cannot save");
+  EXPECT_EQ(user->alerts[0].informativeText, "Not an externally linked layer");
+
+  const auto path = saved(*layerOf(3), "back.rwb");
+  const auto linked = PointLayer::initWithURLShouldLink(path, true);
+  ASSERT_TRUE(linked);
+  linked->colorPoints()[1].r = 99;
+  linked->setIsModified(true);
+  linked->saveLinkedLayer();
+  EXPECT_FALSE(linked->isModified());
+  EXPECT_EQ(readAll(path)[88 + 16 + 12], 99);
+}
+
+TEST_F(PointLayerTest, PointSizeChangesUndoByName) {
+  MyDocument document;
+  const auto layer = layerOf(1);
+  document.addLayer(layer);
+  document.undoManager().closeEventGroup();
+  layer->setPointSize(4.0f);
+  document.undoManager().closeEventGroup();
+  EXPECT_EQ(document.undoManager().undoActionName(), "Change Point Size");
+  document.undoManager().undo();
+  EXPECT_EQ(layer->pointSize(), 1.0f);  // the registered default
+}
+
+}  // namespace
+}  // namespace cloudreel
