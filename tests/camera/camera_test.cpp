@@ -101,15 +101,6 @@ TEST(Camera, NewCopiedAndDecodedCamerasGetTheirLensAsTheyShould) {
   }
 }
 
-TEST(Camera, FieldOfViewInRadiansIsComputedInSinglePrecision) {
-  for (const auto& [degrees, radians] :
-       {std::pair{90.0f, 1.5707963705062866}, std::pair{180.0f, 3.1415927410125732}}) {
-    Camera camera;
-    camera.setFieldOfView(degrees);
-    EXPECT_EQ(static_cast<double>(camera.fieldOfViewInRadians()), radians) << degrees;
-  }
-}
-
 TEST(Camera, TransformationTurnsBeforeItPlaces) {
   Camera camera;
   camera.inertialToObject()->setEulerRotationType({0, 0, 90}, 11);  // x turns to -z

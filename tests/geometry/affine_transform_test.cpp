@@ -31,7 +31,8 @@ TEST(Vector3, NormalizeAndEqualityTolerances) {
   struct NormalizeCase {
     P in, out;
   };
-  for (const auto& c : {NormalizeCase{{0, 0, 0}, {0, 0, 1}}, {{1e-7, 0, 0}, {0, 0, 1}},
+  for (const auto& c : {NormalizeCase{{0, 0, 0}, {0, 0, 1}},
+                        {{1e-7, 0, 0}, {0, 0, 1}},
                         {{3, 0, 4}, {0.6, 0, 0.8}}}) {
     Vector3 v(c.in);
     v.normalize();
@@ -65,7 +66,6 @@ TEST(Vector3, SettersNotifyObserversAndSubscribers) {
     int changes = 0;
     void observeChange(const Notification&) override { ++changes; }
   } subscriber;
-  CallbackObserver observer([](std::string_view, Object&, const Change&, std::string_view) {});
   std::vector<std::string> keys;
   CallbackObserver recorder([&](std::string_view key, Object&, const Change&, std::string_view) {
     keys.emplace_back(key);
@@ -157,13 +157,13 @@ TEST(AffineTransform, KeyValueNoticesComeFromTheOwnersBrackets) {
   auto t = std::make_shared<AffineTransform>();
   std::vector<std::string> keys;
   std::vector<float> oldScales;
-  CallbackObserver recorder([&](std::string_view key, Object&, const Change& change,
-                                std::string_view) {
-    keys.emplace_back(key);
-    if (key == "scale") {
-      oldScales.push_back(std::get<float>(*change.oldValue));
-    }
-  });
+  CallbackObserver recorder(
+      [&](std::string_view key, Object&, const Change& change, std::string_view) {
+        keys.emplace_back(key);
+        if (key == "scale") {
+          oldScales.push_back(std::get<float>(*change.oldValue));
+        }
+      });
   for (const char* key : {"scale", "translationX", "translationY", "translationZ"}) {
     t->addObserver(recorder, key, ObservingOptions::Old, "Scale");
   }
@@ -172,7 +172,8 @@ TEST(AffineTransform, KeyValueNoticesComeFromTheOwnersBrackets) {
   t->sendKVOWillChange();
   t->setScale(2);
   t->sendKVODidChange();
-  EXPECT_EQ(keys, std::vector<std::string>({"scale", "translationX", "translationY", "translationZ"}));
+  EXPECT_EQ(keys,
+            std::vector<std::string>({"scale", "translationX", "translationY", "translationZ"}));
   EXPECT_EQ(oldScales, std::vector<float>({1.0f}));
   // Key-value coding reaches the same operations.
   EXPECT_TRUE(t->setValueForKey(Value(1.0), "scale"));

@@ -5,6 +5,7 @@
 #include <cmath>
 #include <functional>
 #include <limits>
+#include <tuple>
 
 #include "platform/class_registry.h"
 #include "platform/keyed_archiver.h"
@@ -50,11 +51,19 @@ std::shared_ptr<T> roundTrip(const std::shared_ptr<T>& object) {
   return std::dynamic_pointer_cast<T>(decoded);
 }
 
+// An animated layer's settings in one comparable value: name, isVisible,
+// isInWorld, animate, animationPath, billboardDistance, enableFog, nFrames,
+// FPS.
+auto settingsOf(const AnimatedLayer& l) {
+  return std::tuple(l.name(), l.isVisible(), l.isInWorld(), l.animate(), l.animationPath(),
+                    l.billboardDistance(), l.enableFog(), l.nFrames(), l.FPS());
+}
+
 TEST(Layer, BillboardDistanceIsNeverNegative) {
   const struct {
     float set, stored;
-  } cases[] = {{-2.0f, 0.0f}, {3.5f, 3.5f}, {0.0f, 0.0f},
-               {std::numeric_limits<float>::quiet_NaN(), 0.0f}};
+  } cases[] = {
+      {-2.0f, 0.0f}, {3.5f, 3.5f}, {0.0f, 0.0f}, {std::numeric_limits<float>::quiet_NaN(), 0.0f}};
   for (const auto& c : cases) {
     Layer layer;
     layer.setBillboardDistance(c.set);
@@ -65,7 +74,7 @@ TEST(Layer, BillboardDistanceIsNeverNegative) {
   }
 }
 
-TEST(Layer, CopyAppendsToTheNameSharesChildrenAndLeavesEditingStateBehind) {
+TEST(Layer, CopyKeepsTheClassAppendsToTheNameSharesChildrenAndLeavesEditingStateBehind) {
   auto child = std::make_shared<Layer>();
   Layer cloud;
   cloud.setName("Cloud");
@@ -92,16 +101,15 @@ TEST(Layer, CopyAppendsToTheNameSharesChildrenAndLeavesEditingStateBehind) {
   // Adding to the copy's list leaves the original's alone.
   copy->addChildLayer(std::make_shared<Layer>());
   EXPECT_EQ(cloud.childLayerCount(), 1);
-}
 
-TEST(Layer, CopiesAreOfTheOriginalsClass) {
+  // Copies are of the original's class.
   AnimatedLayer animated;
   animated.setFPS(12);
   animated.setNFrames(48);
-  const auto copy = copyOf(animated);
-  EXPECT_EQ(copy->className(), "AnimatedLayer");
-  EXPECT_EQ(copy->FPS(), 12);
-  EXPECT_EQ(copy->nFrames(), 48);
+  const auto animatedCopy = copyOf(animated);
+  EXPECT_EQ(animatedCopy->className(), "AnimatedLayer");
+  EXPECT_EQ(animatedCopy->FPS(), 12);
+  EXPECT_EQ(animatedCopy->nFrames(), 48);
   EXPECT_EQ(copyOf(LightSource())->className(), "LightSource");
 }
 
@@ -130,11 +138,11 @@ TEST(LayerArchive, WritesTheBoxInItsOwnOrder) {
       KeyedArchiver::archivedDataWithRootObject(layer), &error, registry));
   ASSERT_TRUE(probe) << error.message;
   EXPECT_EQ(probe->box, (Layer::BoundingBox{1, 3, 5, 2, 4, 6}));
-  EXPECT_EQ(probe->keys, (std::vector<std::string>{
-                             "animate", "animationPath", "bbox00", "bbox01", "bbox02", "bbox03",
-                             "bbox04", "bbox05", "billboardDistance", "childLayers", "enableFog",
-                             "inertialToObject", "isInWorld", "isVisible", "layerName",
-                             "objectToWorld"}));
+  EXPECT_EQ(probe->keys,
+            (std::vector<std::string>{"animate", "animationPath", "bbox00", "bbox01", "bbox02",
+                                      "bbox03", "bbox04", "bbox05", "billboardDistance",
+                                      "childLayers", "enableFog", "inertialToObject", "isInWorld",
+                                      "isVisible", "layerName", "objectToWorld"}));
 }
 
 TEST(LayerArchive, RoundTripsTheTreeAndItsSettings) {
@@ -159,15 +167,7 @@ TEST(LayerArchive, RoundTripsTheTreeAndItsSettings) {
 
   const auto decoded = roundTrip(root);
   ASSERT_TRUE(decoded);
-  EXPECT_EQ(decoded->name(), "Root");
-  EXPECT_FALSE(decoded->isVisible());
-  EXPECT_FALSE(decoded->isInWorld());
-  EXPECT_TRUE(decoded->animate());
-  EXPECT_EQ(decoded->animationPath(), 3);
-  EXPECT_EQ(decoded->billboardDistance(), 2.5f);
-  EXPECT_TRUE(decoded->enableFog());
-  EXPECT_EQ(decoded->nFrames(), 90);
-  EXPECT_EQ(decoded->FPS(), 30);
+  EXPECT_EQ(settingsOf(*decoded), std::tuple("Root", false, false, true, 3, 2.5f, true, 90, 30));
   EXPECT_EQ(decoded->bbox(), root->bbox());
   EXPECT_EQ(decoded->objectToWorld()->mx(), root->objectToWorld()->mx());
   EXPECT_EQ(decoded->inertialToObject()->mx(), root->inertialToObject()->mx());
@@ -180,12 +180,9 @@ TEST(LayerArchive, RoundTripsTheTreeAndItsSettings) {
 TEST(LayerArchive, MissingKeysReadAsZeroNoAndNothing) {
   const auto layer = decodeFrom<AnimatedLayer>("AnimatedLayer", [](KeyedArchiver&) {});
   ASSERT_TRUE(layer);
-  EXPECT_EQ(layer->name(), "");
-  EXPECT_FALSE(layer->isVisible());
-  EXPECT_FALSE(layer->isInWorld());
-  EXPECT_EQ(layer->billboardDistance(), 0.0f);
+  // FPS 0, not the 25 of a new layer.
+  EXPECT_EQ(settingsOf(*layer), std::tuple("", false, false, false, 0, 0.0f, false, 0, 0));
   EXPECT_EQ(layer->childLayerCount(), 0);
-  EXPECT_EQ(layer->FPS(), 0);  // not the 25 of a new layer
   EXPECT_EQ(layer->objectToWorld()->mx(), AffineTransform::kIdentity);
   EXPECT_EQ(layer->inertialToObject()->mx(), AffineTransform::kIdentity);
 
