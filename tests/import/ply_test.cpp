@@ -1,0 +1,452 @@
+#include "import/ply/ply.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <bit>
+#include <charconv>
+#include <cstdint>
+#include <cstring>
+#include <fstream>
+#include <limits>
+#include <random>
+#include <string>
+#include <vector>
+
+#include "support/temp_dir.h"
+
+namespace cloudreel {
+namespace {
+
+// --- Writing test files ----------------------------------------------------
+
+struct TestProperty {
+  std::string type;
+  std::string name;
+  std::string lengthType = "";  // empty for a scalar
+};
+
+// Each instance is its values in file order; a list gives its length first.
+struct TestElement {
+  std::string name;
+  std::vector<TestProperty> properties;
+  std::vector<std::vector<double>> instances;
+};
+
+void putValue(std::string& out, const std::string& type, double v, const std::string& format) {
+  if (format == "ascii") {
+    char text[64];
+    char* end = type == "float" || type == "float32" ? std::to_chars(text, text + 64, float(v)).ptr
+                : type == "double" || type == "float64"
+                    ? std::to_chars(text, text + 64, v).ptr
+                    : std::to_chars(text, text + 64, static_cast<long long>(v)).ptr;
+    out.append(text, end).push_back(' ');
+    return;
+  }
+  auto bytes = [&](auto x) {
+    char b[sizeof x];
+    std::memcpy(b, &x, sizeof x);
+    if ((format == "binary_big_endian") != (std::endian::native == std::endian::big)) {
+      std::reverse(b, b + sizeof x);
+    }
+    out.append(b, sizeof x);
+  };
+  if (type == "char" || type == "int8") bytes(std::int8_t(v));
+  if (type == "uchar" || type == "uint8") bytes(std::uint8_t(v));
+  if (type == "short" || type == "int16") bytes(std::int16_t(v));
+  if (type == "ushort" || type == "uint16") bytes(std::uint16_t(v));
+  if (type == "int" || type == "int32") bytes(std::int32_t(v));
+  if (type == "uint" || type == "uint32") bytes(std::uint32_t(v));
+  if (type == "float" || type == "float32") bytes(float(v));
+  if (type == "double" || type == "float64") bytes(v);
+}
+
+std::string plyText(const std::vector<TestElement>& elements, const std::string& format,
+                    const std::string& eol = "\n", const std::string& extraHeader = "") {
+  std::string out = "ply" + eol + "format " + format + " 1.0" + eol + extraHeader;
+  for (const auto& e : elements) {
+    out += "element " + e.name + " " + std::to_string(e.instances.size()) + eol;
+    for (const auto& p : e.properties) {
+      out += "property " + (p.lengthType.empty() ? "" : "list " + p.lengthType + " ") + p.type +
+             " " + p.name + eol;
+    }
+  }
+  out += "end_header" + eol;
+  for (const auto& e : elements) {
+    for (const auto& values : e.instances) {
+      std::size_t v = 0;
+      for (const auto& p : e.properties) {
+        std::size_t items = p.lengthType.empty() ? 1 : std::size_t(values[v]);
+        if (!p.lengthType.empty()) putValue(out, p.lengthType, values[v++], format);
+        for (std::size_t i = 0; i < items; ++i) putValue(out, p.type, values[v++], format);
+      }
+      if (format == "ascii") out += eol;
+    }
+  }
+  return out;
+}
+
+// --- Reading them back -----------------------------------------------------
+
+// One callback call: `key` is element index * 100 + property index.
+struct Call {
+  long key, instance, length, valueIndex;
+  double value;
+  friend bool operator==(const Call&, const Call&) = default;
+};
+
+struct Outcome {
+  bool ok = false;
+  std::vector<Call> calls;
+  std::vector<std::string> errors;
+  std::size_t stopAfter = SIZE_MAX;  // the callback answers 0 at this call
+};
+
+void recordError(p_ply ply, const char* message) {
+  void* outcome = nullptr;
+  ply_get_ply_user_data(ply, &outcome, nullptr);
+  static_cast<Outcome*>(outcome)->errors.push_back(message);
+}
+
+int recordCall(p_ply_argument argument) {
+  void* pdata = nullptr;
+  long key = 0;
+  ply_get_argument_user_data(argument, &pdata, &key);
+  auto& outcome = *static_cast<Outcome*>(pdata);
+  Call call{key, 0, 0, 0, ply_get_argument_value(argument)};
+  ply_get_argument_element(argument, nullptr, &call.instance);
+  ply_get_argument_property(argument, nullptr, &call.length, &call.valueIndex);
+  outcome.calls.push_back(call);
+  return outcome.calls.size() != outcome.stopAfter;
+}
+
+// Registers the callback for every property except those of `skipped`.
+Outcome readPly(p_ply ply, Outcome& outcome, const std::string& skipped = "") {
+  if (ply && ply_read_header(ply)) {
+    long e = 0;
+    for (p_ply_element element = nullptr; (element = ply_get_next_element(ply, element)); ++e) {
+      const char* elementName = nullptr;
+      ply_get_element_info(element, &elementName, nullptr);
+      long p = 0;
+      for (p_ply_property property = nullptr; (property = ply_get_next_property(element, property));
+           ++p) {
+        const char* name = nullptr;
+        ply_get_property_info(property, &name, nullptr, nullptr, nullptr);
+        if (skipped != elementName) {
+          ply_set_read_cb(ply, elementName, name, recordCall, &outcome, e * 100 + p);
+        }
+      }
+    }
+    outcome.ok = ply_read(ply);
+  }
+  ply_close(ply);
+  return outcome;
+}
+
+Outcome readFile(const std::filesystem::path& path, const std::string& skipped = "",
+                 std::size_t stopAfter = SIZE_MAX) {
+  Outcome outcome;
+  outcome.stopAfter = stopAfter;
+  return readPly(ply_open(path.c_str(), recordError, 0, &outcome), outcome, skipped);
+}
+
+Outcome readBytes(const std::string& bytes) {
+  Outcome outcome;
+  return readPly(
+      ply_open_from_memory(bytes.data(), bytes.size(), "memory", recordError, 0, &outcome),
+      outcome);
+}
+
+void writeFile(const std::filesystem::path& path, const std::string& bytes) {
+  std::ofstream(path, std::ios::binary) << bytes;
+}
+
+// The calls a read of every property makes, by the list protocol.
+std::vector<Call> expectedCalls(const std::vector<TestElement>& elements,
+                                const std::string& skipped) {
+  std::vector<Call> calls;
+  for (long e = 0; e < long(elements.size()); ++e) {
+    const auto& element = elements[std::size_t(e)];
+    for (long i = 0; i < long(element.instances.size()) && element.name != skipped; ++i) {
+      const auto& values = element.instances[std::size_t(i)];
+      std::size_t v = 0;
+      for (long p = 0; p < long(element.properties.size()); ++p) {
+        if (element.properties[std::size_t(p)].lengthType.empty()) {
+          calls.push_back({e * 100 + p, i, 1, 0, values[v++]});
+          continue;
+        }
+        long n = long(values[v]);
+        calls.push_back({e * 100 + p, i, n, -1, values[v++]});
+        for (long k = 0; k < n; ++k) calls.push_back({e * 100 + p, i, n, k, values[v++]});
+      }
+    }
+  }
+  return calls;
+}
+
+const std::vector<std::string> kFormats = {"ascii", "binary_little_endian", "binary_big_endian"};
+
+// Enough vertices that binary and ASCII data cross the reader's block
+// boundaries, then faces with lists (one empty), then a last element that
+// is read correctly only if the faces were passed over correctly.
+std::vector<TestElement> sampleScene(int vertices) {
+  std::mt19937 random(7);
+  std::uniform_real_distribution<float> coordinate(-1000.0f, 1000.0f);
+  TestElement vertex{"vertex",
+                     {{"float", "x"},
+                      {"float", "y"},
+                      {"float", "z"},
+                      {"uchar", "red"},
+                      {"uchar", "green"},
+                      {"uchar", "blue"}},
+                     {}};
+  for (int i = 0; i < vertices; ++i) {
+    vertex.instances.push_back({coordinate(random), coordinate(random), coordinate(random),
+                                double(i % 256), double(random() % 256), 255});
+  }
+  TestElement face{"face",
+                   {{"int", "vertex_indices", "uchar"}, {"uchar", "flags"}},
+                   {{3, 0, 1, 2, 7}, {0, 8}, {4, 3, 2, 1, 0, 9}}};
+  TestElement edge{"edge", {{"int", "vertex1"}, {"int", "vertex2"}}, {{-5, 2147483647}}};
+  return {vertex, face, edge};
+}
+
+TEST(PlyReader, ReadsTheSameScenesInEveryFormatWithListsReadOrSkipped) {
+  testing::TempDir dir;
+  auto scene = sampleScene(20000);
+  for (const auto& format : kFormats) {
+    writeFile(dir / format, plyText(scene, format));
+    for (std::string skipped : {"", "face"}) {
+      SCOPED_TRACE(format + " skipping '" + skipped + "'");
+      Outcome outcome = readFile(dir / format, skipped);
+      EXPECT_TRUE(outcome.ok);
+      EXPECT_TRUE(outcome.errors.empty());
+      EXPECT_TRUE(outcome.calls == expectedCalls(scene, skipped));
+    }
+  }
+}
+
+TEST(PlyReader, CallsAListCallbackWithTheLengthThenEachItem) {
+  testing::TempDir dir;
+  writeFile(dir / "faces", plyText({sampleScene(0)[1]}, "binary_little_endian"));
+  Outcome outcome = readFile(dir / "faces");
+  std::vector<Call> expected = {{0, 0, 3, -1, 3}, {0, 0, 3, 0, 0},  {0, 0, 3, 1, 1},
+                                {0, 0, 3, 2, 2},  {1, 0, 1, 0, 7},  {0, 1, 0, -1, 0},
+                                {1, 1, 1, 0, 8},  {0, 2, 4, -1, 4}, {0, 2, 4, 0, 3}};
+  ASSERT_GE(outcome.calls.size(), expected.size());
+  EXPECT_TRUE(std::equal(expected.begin(), expected.end(), outcome.calls.begin()));
+}
+
+TEST(PlyReader, ReadsEveryScalarTypeUnderBothNames) {
+  struct Row {
+    const char* name;
+    e_ply_type type;
+    double value;
+  } rows[] = {
+      {"char", PLY_CHAR, -128},           {"int8", PLY_INT8, 127},
+      {"uchar", PLY_UCHAR, 255},          {"uint8", PLY_UINT8, 128},
+      {"short", PLY_SHORT, -32768},       {"int16", PLY_INT16, 32767},
+      {"ushort", PLY_USHORT, 65535},      {"uint16", PLY_UINT16, 1},
+      {"int", PLY_INT, -2147483648.0},    {"int32", PLY_INT32, 2147483647},
+      {"uint", PLY_UINT, 4294967295.0},   {"uint32", PLY_UINT32, 3},
+      {"float", PLY_FLOAT, double(0.1f)}, {"float32", PLY_FLOAT32, -3.4028234663852886e38},
+      {"double", PLY_DOUBLE, 0.1},        {"float64", PLY_FLOAT64, -1e-300},
+  };
+  TestElement sample{"sample", {}, {{}}};
+  for (const Row& row : rows) {
+    sample.properties.push_back({row.name, std::string("p_") + row.name});
+    sample.instances[0].push_back(row.value);
+  }
+  testing::TempDir dir;
+  for (const auto& format : kFormats) {
+    SCOPED_TRACE(format);
+    writeFile(dir / format, plyText({sample}, format));
+    Outcome outcome = readFile(dir / format);
+    EXPECT_TRUE(outcome.calls == expectedCalls({sample}, ""));
+    Outcome unused;
+    PlyHandle ply(ply_open((dir / format).c_str(), recordError, 0, &unused));
+    ASSERT_TRUE(ply_read_header(ply.get()));
+    p_ply_property property = nullptr;
+    for (const Row& row : rows) {
+      property = ply_get_next_property(ply_get_next_element(ply.get(), nullptr), property);
+      e_ply_type type = PLY_LIST;
+      ply_get_property_info(property, nullptr, &type, nullptr, nullptr);
+      EXPECT_EQ(type, row.type) << row.name;
+      EXPECT_STREQ(ply_type_name(type), row.name);
+    }
+  }
+}
+
+// A header with CR LF line ends, comments, obj_info and an element without
+// instances, in ASCII (whose data has CR LF too) and in binary.
+TEST(PlyReader, ReadsHeaderDetailsAndCrLfLineEnds) {
+  std::vector<TestElement> scene = {
+      {"vertex", {{"float", "x"}, {"int", "id"}}, {{1.5, 7}, {-2, 8}}},
+      {"camera", {{"float", "fov"}}, {}},
+      {"face", {{"int", "vertex_indices", "uchar"}}, {{2, 0, 1}}}};
+  testing::TempDir dir;
+  for (const char* format : {"ascii", "binary_big_endian"}) {
+    SCOPED_TRACE(format);
+    writeFile(dir / format,
+              plyText(scene, format, "\r\n", "comment made by hand\r\nobj_info x\r\ncomment\r\n"));
+    Outcome outcome = readFile(dir / format);
+    EXPECT_TRUE(outcome.ok);
+    EXPECT_TRUE(outcome.calls == expectedCalls(scene, ""));
+
+    PlyHandle ply(ply_open((dir / format).c_str(), recordError, 0, &outcome));
+    ASSERT_TRUE(ply_read_header(ply.get()));
+    EXPECT_STREQ(ply_storage_mode_name(ply_get_storage_mode(ply.get())), format);
+    const char* comment = ply_get_next_comment(ply.get(), nullptr);
+    EXPECT_STREQ(comment, "made by hand");
+    EXPECT_STREQ(ply_get_next_comment(ply.get(), comment), "");
+    EXPECT_STREQ(ply_get_next_obj_info(ply.get(), nullptr), "x");
+    EXPECT_EQ(ply_get_next_comment(ply.get(), ply_get_next_comment(ply.get(), comment)), nullptr);
+    EXPECT_EQ(ply_set_read_cb(ply.get(), "vertex", "id", recordCall, &outcome, 0), 2);
+    EXPECT_EQ(ply_set_read_cb(ply.get(), "camera", "fov", recordCall, &outcome, 0), 0);
+    EXPECT_EQ(ply_set_read_cb(ply.get(), "vertex", "fov", recordCall, &outcome, 0), 0);
+    EXPECT_EQ(ply_set_read_cb(ply.get(), "edge", "x", recordCall, &outcome, 0), 0);
+  }
+}
+
+TEST(PlyReader, ReadsAsciiValuesAsOtherWritersWriteThem) {
+  struct Case {
+    const char* type;
+    const char* text;
+    double value;
+  } cases[] = {
+      {"float", "+1.5", 1.5},
+      {"float", "1e-40", double(1e-40f)},
+      {"float", "1e-50", 0.0},
+      {"float", "-1e39", -std::numeric_limits<double>::infinity()},
+      {"double", "-.5e-3", -0.0005},
+      {"uchar", "300", 300},
+      {"int", "+7", 7},
+  };
+  testing::TempDir dir;
+  for (const Case& c : cases) {
+    writeFile(dir / "value.ply", std::string("ply\nformat ascii 1.0\nelement v 1\nproperty ") +
+                                     c.type + " x\nend_header\n" + c.text + "\r\n");
+    Outcome outcome = readFile(dir / "value.ply");
+    ASSERT_EQ(outcome.calls.size(), 1u) << c.text;
+    EXPECT_EQ(outcome.calls[0].value, c.value) << c.text;
+  }
+}
+
+TEST(PlyReader, StopsWhenACallbackAnswersZero) {
+  testing::TempDir dir;
+  for (const auto& format : kFormats) {
+    writeFile(dir / format, plyText(sampleScene(10), format));
+    Outcome outcome = readFile(dir / format, "", 3);
+    EXPECT_FALSE(outcome.ok) << format;
+    EXPECT_EQ(outcome.calls.size(), 3u) << format;
+    ASSERT_EQ(outcome.errors.size(), 1u) << format;
+    EXPECT_NE(outcome.errors[0].find("stopped by the callback"), std::string::npos);
+  }
+}
+
+TEST(PlyReader, ReportsBrokenFilesThroughTheErrorCallback) {
+  const std::string vertexX = "element vertex 2\nproperty float x\nend_header\n";
+  const std::string faces = "element face 1\nproperty list uchar int v\nend_header\n";
+  struct Case {
+    const char* what;
+    std::string bytes;
+    const char* message;
+  } cases[] = {
+      {"an empty file", "", "not a PLY file"},
+      {"bad magic", "plx\nformat ascii 1.0\n" + vertexX, "not a PLY file"},
+      {"no end_header", "ply\nformat ascii 1.0\nelement vertex 1\n", "without \"end_header\""},
+      {"no format", "ply\n" + vertexX, "no format"},
+      {"unknown format", "ply\nformat binary_middle_endian 1.0\n" + vertexX, "unknown format"},
+      {"unknown version", "ply\nformat ascii 2.0\n" + vertexX, "version"},
+      {"unknown type", "ply\nformat ascii 1.0\nelement v 1\nproperty flaot x\nend_header\n1\n",
+       "unknown property type"},
+      {"a float list length",
+       "ply\nformat ascii 1.0\nelement f 1\nproperty list float int v\nend_header\n0\n",
+       "non-integer length"},
+      {"property first", "ply\nformat ascii 1.0\nproperty float x\n" + vertexX,
+       "before any element"},
+      {"unknown keyword", "ply\nformat ascii 1.0\nelemnt vertex 1\nend_header\n", "not understood"},
+      {"negative count", "ply\nformat ascii 1.0\nelement vertex -1\nend_header\n", "bad instance"},
+      {"huge count", "ply\nformat ascii 1.0\nelement v 99999999999999999999\nend_header\n",
+       "bad instance"},
+      {"hostile binary count",
+       "ply\nformat binary_little_endian 1.0\nelement vertex 2147483648\nproperty float x\n"
+       "end_header\n" +
+           std::string(100, '\0'),
+       "more than the"},
+      {"hostile ascii count",
+       "ply\nformat ascii 1.0\nelement vertex 9223372036854775807\nproperty float x\n"
+       "property list int int v\nend_header\n" +
+           std::string(100, '1'),
+       "more than the"},
+      {"truncated ascii data", "ply\nformat ascii 1.0\n" + vertexX + "1", "more than the"},
+      {"cut ascii data", "ply\nformat ascii 1.0\n" + vertexX + "1.5", "ends inside"},
+      {"truncated binary data", "ply\nformat binary_little_endian 1.0\n" + vertexX + "abcde",
+       "more than the"},
+      {"a binary list past the end",
+       "ply\nformat binary_big_endian 1.0\n" + faces + "\xC8" + std::string(12, '\0'),
+       "ends inside"},
+      {"an ASCII list past the end", "ply\nformat ascii 1.0\n" + faces + "200 1 2 3\n",
+       "ends inside"},
+      {"a negative list length",
+       "ply\nformat binary_little_endian 1.0\nelement f 1\nproperty list char int v\n"
+       "end_header\n\xFF",
+       "negative list length"},
+      {"a bad ASCII value", "ply\nformat ascii 1.0\n" + vertexX + "1.5 abc\n", "bad value"},
+      {"a fraction for an int", "ply\nformat ascii 1.0\n" + faces + "1.5 1\n", "bad value"},
+  };
+  testing::TempDir dir;
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    writeFile(dir / "broken.ply", c.bytes);
+    Outcome outcome = readFile(dir / "broken.ply");
+    EXPECT_FALSE(outcome.ok);
+    ASSERT_EQ(outcome.errors.size(), 1u);
+    EXPECT_EQ(outcome.errors[0].rfind((dir / "broken.ply").string() + ": ", 0), 0u)
+        << outcome.errors[0];
+    EXPECT_NE(outcome.errors[0].find(c.message), std::string::npos) << outcome.errors[0];
+  }
+}
+
+TEST(PlyReader, ReportsOnStandardErrorWithoutAnErrorCallback) {
+  ::testing::internal::CaptureStderr();
+  EXPECT_EQ(ply_open("/nonexistent/cloudreel.ply", nullptr, 0, nullptr), nullptr);
+  EXPECT_EQ(::testing::internal::GetCapturedStderr(),
+            "RPly: /nonexistent/cloudreel.ply: cannot open the file: No such file or directory\n");
+}
+
+// Random damage to small valid files: every read either succeeds or fails
+// with exactly one report, and never crashes (the sanitizer build checks the
+// memory accesses).
+TEST(PlyReader, SurvivesRandomCorruption) {
+  testing::TempDir dir;
+  std::mt19937 random(1234);
+  for (const auto& format : kFormats) {
+    const std::string valid = plyText(sampleScene(12), format);
+    for (int round = 0; round < 1000; ++round) {
+      std::string bytes = valid;
+      switch (random() % 3) {
+        case 0:
+          bytes.resize(random() % bytes.size());
+          break;
+        case 1:
+          for (int n = 1 + int(random() % 4); n > 0; --n)
+            bytes[random() % bytes.size()] = char(random());
+          break;
+        default:
+          bytes.insert(random() % bytes.size(), std::string(1 + random() % 8, char(random())));
+      }
+      Outcome outcome;
+      if (round % 50 != 0) {
+        outcome = readBytes(bytes);
+      } else {
+        writeFile(dir / "damaged.ply", bytes);
+        outcome = readFile(dir / "damaged.ply");
+      }
+      ASSERT_EQ(outcome.errors.size(), outcome.ok ? 0u : 1u) << format << " round " << round;
+    }
+  }
+}
+
+}  // namespace
+}  // namespace cloudreel
