@@ -1,0 +1,201 @@
+// Reading PLY point clouds the way the point-file import does: a vertex of
+// x, y, z as float and red, green, blue as uchar, every value handed to a
+// callback that stores it into a packed 16-byte record. Ten million vertices,
+// in binary little-endian and in ASCII, reported as vertices per second.
+//
+// CLOUDREEL_BENCH_DIR sets the folder for the files (default the temporary
+// folder); they are written once per run and removed at its end.
+
+#include <benchmark/benchmark.h>
+
+#include <charconv>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "import/ply/ply.h"
+
+namespace cloudreel {
+namespace {
+
+constexpr long kVertices = 10'000'000;
+
+struct Record {
+  float x, y, z;
+  std::uint8_t red, green, blue, spare;
+};
+static_assert(sizeof(Record) == 16);
+
+// Points on a wavy sheet, coloured by position: deterministic, and with the
+// spread of digits a scanned scene has.
+Record vertex(long i) {
+  float u = static_cast<float>(i % 4000) * 0.0025f - 5.0f;
+  float v = static_cast<float>(i / 4000) * 0.0025f - 3.125f;
+  float w = 0.25f * u * v + 0.001f * static_cast<float>(i % 7);
+  return Record{u,
+                v,
+                w,
+                static_cast<std::uint8_t>(i),
+                static_cast<std::uint8_t>(i >> 8),
+                static_cast<std::uint8_t>(i * 7),
+                0};
+}
+
+std::string header(const char* format) {
+  return std::string("ply\nformat ") + format + " 1.0\nelement vertex " +
+         std::to_string(kVertices) +
+         "\nproperty float x\nproperty float y\nproperty float z\n"
+         "property uchar red\nproperty uchar green\nproperty uchar blue\nend_header\n";
+}
+
+bool writeFile(const std::filesystem::path& path, bool ascii) {
+  std::FILE* file = std::fopen(path.c_str(), "wb");
+  if (file == nullptr) {
+    return false;
+  }
+  std::string text = header(ascii ? "ascii" : "binary_little_endian");
+  // Appends a number and the separator after it.
+  auto put = [&text](auto value, char separator) {
+    char digits[32];
+    text.append(digits, std::to_chars(digits, digits + sizeof digits, value).ptr);
+    text.push_back(separator);
+  };
+  for (long i = 0; i < kVertices; ++i) {
+    Record r = vertex(i);
+    if (ascii) {
+      put(r.x, ' ');
+      put(r.y, ' ');
+      put(r.z, ' ');
+      put(unsigned{r.red}, ' ');
+      put(unsigned{r.green}, ' ');
+      put(unsigned{r.blue}, '\n');
+    } else {
+      char bytes[15];
+      std::memcpy(bytes, &r, 15);  // little-endian machines only, as the benchmarks run
+      text.append(bytes, 15);
+    }
+    if (text.size() > (std::size_t{1} << 24) || i + 1 == kVertices) {
+      if (std::fwrite(text.data(), 1, text.size(), file) != text.size()) {
+        std::fclose(file);
+        return false;
+      }
+      text.clear();
+    }
+  }
+  return std::fclose(file) == 0;
+}
+
+// The two files, written on first use and removed when the program ends.
+struct BenchFiles {
+  BenchFiles() {
+    const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");
+    std::filesystem::path folder = dir ? dir : std::filesystem::temp_directory_path();
+    binary = folder / "cloudreel-bench-vertices-binary.ply";
+    ascii = folder / "cloudreel-bench-vertices-ascii.ply";
+    ok = writeFile(binary, false) && writeFile(ascii, true);
+  }
+  ~BenchFiles() {
+    std::error_code ignored;
+    std::filesystem::remove(binary, ignored);
+    std::filesystem::remove(ascii, ignored);
+  }
+  std::filesystem::path binary, ascii;
+  bool ok = false;
+};
+
+BenchFiles& benchFiles() {
+  static BenchFiles files;
+  return files;
+}
+
+struct Context {
+  Record* points;
+  std::int32_t index;
+};
+
+// The import's callback: slots 0-2 are x, y, z; 3-5 the colour bytes, and
+// the blue byte completes a record.
+int storeValue(p_ply_argument argument) {
+  void* pdata = nullptr;
+  long slot = 0;
+  ply_get_argument_user_data(argument, &pdata, &slot);
+  auto* context = static_cast<Context*>(pdata);
+  double value = ply_get_argument_value(argument);
+  Record& record = context->points[context->index];
+  switch (slot) {
+    case 0:
+      record.x = static_cast<float>(value);
+      break;
+    case 1:
+      record.y = static_cast<float>(value);
+      break;
+    case 2:
+      record.z = static_cast<float>(value);
+      break;
+    case 3:
+      record.red = static_cast<std::uint8_t>(static_cast<std::int64_t>(value));
+      break;
+    case 4:
+      record.green = static_cast<std::uint8_t>(static_cast<std::int64_t>(value));
+      break;
+    case 5:
+      record.blue = static_cast<std::uint8_t>(static_cast<std::int64_t>(value));
+      ++context->index;
+      break;
+    default:
+      break;
+  }
+  return 1;
+}
+
+void readVertices(benchmark::State& state, const std::filesystem::path& path) {
+  if (!benchFiles().ok) {
+    state.SkipWithError("cannot write the benchmark files");
+    return;
+  }
+  std::vector<Record> points(static_cast<std::size_t>(kVertices));
+  static const char* const kNames[] = {"x", "y", "z", "red", "green", "blue"};
+  for (auto _ : state) {
+    Context context{points.data(), 0};
+    PlyHandle ply(ply_open(path.c_str(), nullptr, 0, nullptr));
+    if (!ply || !ply_read_header(ply.get())) {
+      state.SkipWithError("cannot read the header");
+      return;
+    }
+    long count = 0;
+    for (long slot = 0; slot < 6; ++slot) {
+      long n = ply_set_read_cb(ply.get(), "vertex", kNames[slot], storeValue, &context, slot);
+      count = slot == 0 ? n : count;
+    }
+    if (count != kVertices || !ply_read(ply.get()) || context.index != kVertices) {
+      state.SkipWithError("reading failed");
+      return;
+    }
+    benchmark::DoNotOptimize(points.data());
+    benchmark::ClobberMemory();
+  }
+  Record last = vertex(kVertices - 1);
+  if (std::memcmp(&points.back(), &last, sizeof last) != 0) {
+    state.SkipWithError("the last vertex was read wrongly");
+  }
+  state.counters["vertices_per_second"] =
+      benchmark::Counter(static_cast<double>(kVertices) * static_cast<double>(state.iterations()),
+                         benchmark::Counter::kIsRate);
+}
+
+void BM_ReadBinaryLittleEndian(benchmark::State& state) {
+  readVertices(state, benchFiles().binary);
+}
+BENCHMARK(BM_ReadBinaryLittleEndian)->Iterations(5)->UseRealTime()->Unit(benchmark::kMillisecond);
+
+void BM_ReadAscii(benchmark::State& state) { readVertices(state, benchFiles().ascii); }
+BENCHMARK(BM_ReadAscii)->Iterations(3)->UseRealTime()->Unit(benchmark::kMillisecond);
+
+}  // namespace
+}  // namespace cloudreel
+
+BENCHMARK_MAIN();
