@@ -10,46 +10,15 @@
 #include "platform/class_registry.h"
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
+#include "scene/archive_helpers.h"
 #include "scene/core_classes.h"
 #include "scene/light_source.h"
 
 namespace cloudreel {
 namespace {
 
-// Archives a stand-in that writes only what `write` writes under the class
-// name `className`, and reads it back as the real class.
-template <class T>
-std::shared_ptr<T> decodeFrom(std::string_view className,
-                              std::function<void(KeyedArchiver&)> write) {
-  class Partial : public Object {
-   public:
-    Partial(std::string_view name, std::function<void(KeyedArchiver&)> w)
-        : name_(name), write_(std::move(w)) {}
-    std::string_view className() const override { return name_; }
-    void encodeWithCoder(KeyedArchiver& coder) const override { write_(coder); }
-
-   private:
-    std::string_view name_;
-    std::function<void(KeyedArchiver&)> write_;
-  };
-  registerCoreClasses(ClassRegistry::shared());
-  const Bytes data =
-      KeyedArchiver::archivedDataWithRootObject(std::make_shared<Partial>(className, write));
-  Error error;
-  auto object = KeyedUnarchiver::unarchiveObjectWithData(data, &error);
-  EXPECT_TRUE(object) << error.message;
-  return std::dynamic_pointer_cast<T>(object);
-}
-
-template <class T>
-std::shared_ptr<T> roundTrip(const std::shared_ptr<T>& object) {
-  registerCoreClasses(ClassRegistry::shared());
-  Error error;
-  auto decoded = KeyedUnarchiver::unarchiveObjectWithData(
-      KeyedArchiver::archivedDataWithRootObject(object), &error);
-  EXPECT_TRUE(decoded) << error.message;
-  return std::dynamic_pointer_cast<T>(decoded);
-}
+using testing::decodeFrom;
+using testing::roundTrip;
 
 // An animated layer's settings in one comparable value: name, isVisible,
 // isInWorld, animate, animationPath, billboardDistance, enableFog, nFrames,

@@ -11,6 +11,7 @@
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
 #include "platform/user_defaults.h"
+#include "scene/archive_helpers.h"
 #include "scene/core_classes.h"
 #include "scene/my_document.h"
 #include "support/scripted_user_interaction.h"
@@ -28,7 +29,8 @@ Bytes readAll(const std::filesystem::path& path) {
 
 void writeAll(const std::filesystem::path& path, const Bytes& bytes) {
   std::ofstream(path, std::ios::binary)
-      .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+      .write(reinterpret_cast<const char*>(bytes.data()),
+             static_cast<std::streamsize>(bytes.size()));
 }
 
 // Application defaults in memory, the point cache in a temporary folder and
@@ -56,8 +58,9 @@ class PointLayerTest : public ::testing::Test {
     layer->setNPoints(n);
     int i = 0;
     for (color_point& p : layer->colorPoints()) {
-      p = {float(i), float(2 * i), float(-i), std::uint8_t(i), std::uint8_t(i + 1),
-           std::uint8_t(i + 2), std::uint8_t(7 * i)};
+      p = {float(i),           float(2 * i),        float(-i),
+           std::uint8_t(i),    std::uint8_t(i + 1), std::uint8_t(i + 2),
+           std::uint8_t(7 * i)};
       ++i;
     }
     layer->setBoundingBoxWithMinXMaxXMinYMaxYMinZMaxZ(0, float(n), 0, float(2 * n), float(-n), 0);
@@ -187,14 +190,7 @@ TEST_F(PointLayerTest, InlineLayersTravelInTheArchiveLinkedOnesReloadTheirFile) 
   inlineLayer->setBucketLimit(0.25f);
   inlineLayer->setOpacity(0.3f);
   inlineLayer->setColorMode(1);
-  const auto decode = [](const std::shared_ptr<PointLayer>& layer) {
-    Error error;
-    auto object = KeyedUnarchiver::unarchiveObjectWithData(
-        KeyedArchiver::archivedDataWithRootObject(layer), &error);
-    EXPECT_TRUE(object) << error.message;
-    return std::dynamic_pointer_cast<PointLayer>(object);
-  };
-  const auto back = decode(inlineLayer);
+  const auto back = testing::roundTrip(inlineLayer);
   ASSERT_TRUE(back);
   EXPECT_EQ(recordsOf(*back), recordsOf(*inlineLayer));
   EXPECT_EQ(back->pointSize(), 3.5f);
@@ -206,7 +202,7 @@ TEST_F(PointLayerTest, InlineLayersTravelInTheArchiveLinkedOnesReloadTheirFile) 
   ASSERT_TRUE(linked);
   const Bytes archive = KeyedArchiver::archivedDataWithRootObject(linked);
   EXPECT_LT(archive.size(), 2000u);  // only the file's location travels, not 16,000 bytes
-  const auto reloaded = decode(linked);
+  const auto reloaded = testing::roundTrip(linked);
   ASSERT_TRUE(reloaded);
   EXPECT_EQ(recordsOf(*reloaded), recordsOf(*layerOf(1000)));
 
@@ -221,17 +217,11 @@ TEST_F(PointLayerTest, InlineLayersTravelInTheArchiveLinkedOnesReloadTheirFile) 
 TEST_F(PointLayerTest, OlderDocumentsAndDamagedCountsReadSafely) {
   // An archive of an old layer: no bucket limit, no attenuation, and a
   // point count larger than its blob.
-  struct OldLayer : Object {
-    std::string_view className() const override { return "PointLayer"; }
-    void encodeWithCoder(KeyedArchiver& coder) const override {
-      coder.encodeInt32(1000000, "nPoints");
-      coder.encodeBytes(Bytes(40, 7), "points");
-    }
-  };
-  Error error;
-  const auto layer = std::dynamic_pointer_cast<PointLayer>(KeyedUnarchiver::unarchiveObjectWithData(
-      KeyedArchiver::archivedDataWithRootObject(std::make_shared<OldLayer>()), &error));
-  ASSERT_TRUE(layer) << error.message;
+  const auto layer = testing::decodeFrom<PointLayer>("PointLayer", [](KeyedArchiver& coder) {
+    coder.encodeInt32(1000000, "nPoints");
+    coder.encodeBytes(Bytes(40, 7), "points");
+  });
+  ASSERT_TRUE(layer);
   EXPECT_EQ(layer->bucketLimit(), 1.0f);
   EXPECT_FALSE(layer->attenuatePoints());
   EXPECT_EQ(layer->atten_c(), 1.0f);

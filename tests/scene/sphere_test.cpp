@@ -18,6 +18,7 @@
 #include "platform/keyed_unarchiver.h"
 #include "platform/log.h"
 #include "render/render_options.h"
+#include "scene/archive_helpers.h"
 #include "scene/core_classes.h"
 #include "scene/light_source.h"
 #include "scene/my_document.h"
@@ -29,16 +30,7 @@ namespace {
 
 using testing::Box;
 using testing::Frame;
-
-template <class T>
-std::shared_ptr<T> roundTrip(const std::shared_ptr<T>& object) {
-  registerCoreClasses(ClassRegistry::shared());
-  Error error;
-  auto decoded = KeyedUnarchiver::unarchiveObjectWithData(
-      KeyedArchiver::archivedDataWithRootObject(object), &error);
-  EXPECT_TRUE(decoded) << error.message;
-  return std::dynamic_pointer_cast<T>(decoded);
-}
+using testing::roundTrip;
 
 std::shared_ptr<Sphere> primitive(std::int32_t shape, float size, std::int32_t segments = 64) {
   auto sphere = std::make_shared<Sphere>();
@@ -144,24 +136,15 @@ TEST(Sphere, CopiesAndArchivesKeepEveryPropertyAndOnlyArchivesTheName) {
 // Archives a stand-in that writes a primitive's keys with `color` as the
 // colour's bytes (none when empty), and reads it back as a Sphere.
 std::shared_ptr<Sphere> decodeWithColourBytes(const Bytes& color) {
-  class Stored : public Object {
-   public:
-    explicit Stored(Bytes color) : color_(std::move(color)) {}
-    std::string_view className() const override { return "Sphere"; }
-    void encodeWithCoder(KeyedArchiver& coder) const override {
-      coder.encodeString("Ball", "layerName");
-      coder.encodeInt32(Sphere::kShapeCube, "shape");
-      coder.encodeFloat(2.0f, "size");
-      coder.encodeInt32(6, "segments");
-      if (!color_.empty()) {
-        coder.encodeBytes(color_, "color");
-      }
+  return testing::decodeFrom<Sphere>("Sphere", [color](KeyedArchiver& coder) {
+    coder.encodeString("Ball", "layerName");
+    coder.encodeInt32(Sphere::kShapeCube, "shape");
+    coder.encodeFloat(2.0f, "size");
+    coder.encodeInt32(6, "segments");
+    if (!color.empty()) {
+      coder.encodeBytes(color, "color");
     }
-
-   private:
-    Bytes color_;
-  };
-  return std::dynamic_pointer_cast<Sphere>(roundTrip<Object>(std::make_shared<Stored>(color)));
+  });
 }
 
 TEST(SphereArchive, AMissingOrUnreadableColourReadsAsWhite) {
