@@ -121,6 +121,7 @@ void Layer::drawContentWithOptions(const RenderOptions& options) {
   if (isVisible_) {
     drawGLWithOptions(options);
   }
+  drawDecorationsWithOptions(options);
   // A copy of the list: drawing may not change the tree under the loop.
   const std::vector<std::shared_ptr<Layer>> children = childLayers_;
   for (const auto& child : children) {
@@ -130,6 +131,8 @@ void Layer::drawContentWithOptions(const RenderOptions& options) {
   }
   popTransformation();
 }
+
+void Layer::drawDecorationsWithOptions(const RenderOptions&) {}
 
 void Layer::drawGLWithOptions(const RenderOptions&) {
   logf("defult drawGL!");

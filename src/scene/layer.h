@@ -67,8 +67,9 @@ class Layer : public Animatable3DObject {
   void addChildLayer(std::shared_ptr<Layer> child);
   int childLayerCount() const { return static_cast<int>(childLayers_.size()); }
 
-  // Marks cached drawing data for rebuilding on the next draw.
-  void invalidateOpenGLDisplayLists() { displayListInvalid_ = true; }
+  // Marks cached drawing data for rebuilding on the next draw. Layers that
+  // keep GPU caches of their own also release them here.
+  virtual void invalidateOpenGLDisplayLists() { displayListInvalid_ = true; }
 
   // What kind of layer this is, for the panels and commands.
   virtual bool isPointLayer() const { return false; }
@@ -100,6 +101,10 @@ class Layer : public Animatable3DObject {
   // The layer's own content in object coordinates. The base is a placeholder
   // (a teapot, with a log line) that concrete layers replace.
   virtual void drawGLWithOptions(const RenderOptions& options);
+  // Drawn by the traversal between the layer's own content and its
+  // children, whether or not the layer is visible (a point layer's box in
+  // the editor); the base draws nothing.
+  virtual void drawDecorationsWithOptions(const RenderOptions& options);
 
   // The move/rotate gizmo: points at the origin and at `size` along each
   // axis, and a circle of radius `size` in each coordinate plane.

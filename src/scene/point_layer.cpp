@@ -12,6 +12,7 @@
 #include "platform/log.h"
 #include "platform/user_defaults.h"
 #include "platform/user_interaction.h"
+#include "render/point_drawing.h"
 #include "scene/my_document.h"
 
 namespace cloudreel {
@@ -102,11 +103,13 @@ void PointLayer::setTriangles(std::vector<std::uint32_t> triangles) {
 
 void PointLayer::setPointArray(std::shared_ptr<PointArray> array, std::int32_t count) {
   points_ = std::move(array);
+  pointsDidChange();
   setNPoints(count);
 }
 
 std::uint8_t* PointLayer::allocatePointArrayWithSize(std::int32_t count) {
   points_.reset();
+  pointsDidChange();
   if (count >= 0) {
     points_ = PointArray::allocate(static_cast<std::size_t>(count) * recordSize());
   }
@@ -131,6 +134,7 @@ void PointLayer::reRandomizeWithExponent(float e) {
     // v is in [0, 255] for u in [0, 1); a NaN exponent gives NaN, stored as 0.
     data[16 * i + 15] = static_cast<std::uint8_t>(v >= 0.0f && v <= 255.0f ? v : 0.0f);
   }
+  pointsDidChange();
 }
 
 void PointLayer::setOriginalURL(std::filesystem::path v) {

@@ -24,6 +24,7 @@
 namespace cloudreel {
 
 class FileInputStream;
+struct PointDrawingCache;
 
 // A point: position, colour and the luck byte (0-255) that places it in a
 // bucket. The unit of the array, of the archived blob and of the point file.
@@ -166,6 +167,33 @@ class PointLayer : public Layer {
   void setAtten_b(float v) { changeValueForKey("atten_b", atten_b_, v); }
   void setAtten_c(float v) { changeValueForKey("atten_c", atten_c_, v); }
 
+  // --- drawing
+  // The points whose luck byte is below the threshold are drawn: threshold
+  // = trunc(limit × 255) in single precision, the limit being the layer's
+  // bucketLimit, or the options' global limit when they say to override
+  // (kRenderOptionBucketOverride YES). Limit 1 draws luck 0-254; only a
+  // limit of 1.004 or more draws luck 255 too.
+  std::int32_t luckThresholdForOptions(const RenderOptions& options) const;
+  // Points (or the mesh, or spheres) from the cached drawing, built first
+  // when a trigger asked for it: a threshold other than the one it was
+  // built with, a draw or colour mode change, any point size change, or
+  // invalidateOpenGLDisplayLists. Opacity, attenuation, fixed colour,
+  // wireframe and points-only changes show only after a rebuild.
+  void drawGLWithOptions(const RenderOptions& options) override;
+  // The bounding box, in editor frames only, whether or not the layer is
+  // visible.
+  void drawDecorationsWithOptions(const RenderOptions& options) override;
+  // The box as twelve white lines, from a cached list.
+  void drawBoundingBoxGL();
+  // The point batch of each record layout at a threshold, with the state
+  // the cached drawing was built with.
+  void drawPointsWithNormalsWithLuck(std::int32_t threshold);
+  void drawPointsWithoutNormalsWithLuck(std::int32_t threshold);
+  // Drops the cached drawing of the points and of the box.
+  void invalidateOpenGLDisplayLists() override;
+  bool hasPointDrawing() const;
+  bool hasBoundingBoxDrawing() const;
+
   // The threshold, draw mode and colour mode the cached drawing was built
   // with.
   std::int32_t displayListBuckets() const { return displayListBuckets_; }
@@ -202,8 +230,19 @@ class PointLayer : public Layer {
   void copyInto(Animatable3DObject& target) const override;
 
   void setPointArray(std::shared_ptr<PointArray> array, std::int32_t count);
+  // Call after changing records in place, so that a drawing built later
+  // does not reuse points uploaded before.
+  void pointsDidChange() { ++pointsGeneration_; }
 
  private:
+  PointDrawingCache& drawingCache();
+  // Records that nPoints names and the array really holds.
+  std::size_t drawableRecordCount() const;
+  void buildDrawing(std::int32_t threshold);
+  void replayDrawing();
+  void emitSpheres(std::int32_t threshold);
+  void emitMesh();
+
   std::shared_ptr<PointArray> points_;
   std::int32_t nPoints_ = 0;
   std::int32_t nFaces_ = 0;
@@ -228,6 +267,8 @@ class PointLayer : public Layer {
   float atten_c_ = 1.0f;
   std::int32_t listUsesDrawMode_ = 0;
   std::int32_t listUsesColorMode_ = 0;
+  std::unique_ptr<PointDrawingCache> drawing_;
+  std::uint64_t pointsGeneration_ = 0;
 };
 
 }  // namespace cloudreel

@@ -12,7 +12,7 @@ void DisplayList::call() const {
   }
 }
 
-bool DisplayList::beginCompile() {
+bool DisplayList::beginCompile(GLenum mode) {
   GLContext* context = GLContext::current();
   assert(context != nullptr);
   if (context == nullptr) {
@@ -24,7 +24,7 @@ bool DisplayList::beginCompile() {
     return false;
   }
   list_ = GLName(*context, NameKind::DisplayList, name);
-  glNewList(name, GL_COMPILE);
+  glNewList(name, mode);
   return true;
 }
 

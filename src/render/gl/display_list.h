@@ -19,12 +19,12 @@ class DisplayList {
   // context is current.
   template <typename Draw>
   bool compile(Draw&& draw) {
-    if (!beginCompile()) {
-      return false;
-    }
-    std::forward<Draw>(draw)();
-    endCompile();
-    return true;
+    return record(std::forward<Draw>(draw), GL_COMPILE);
+  }
+  // As compile, and what is recorded is drawn in the same pass.
+  template <typename Draw>
+  bool compileAndExecute(Draw&& draw) {
+    return record(std::forward<Draw>(draw), GL_COMPILE_AND_EXECUTE);
   }
 
   // Calls the list, compiling it from `draw` first when there is none that
@@ -46,7 +46,16 @@ class DisplayList {
   GLuint name() const { return list_.get(); }
 
  private:
-  bool beginCompile();
+  template <typename Draw>
+  bool record(Draw&& draw, GLenum mode) {
+    if (!beginCompile(mode)) {
+      return false;
+    }
+    std::forward<Draw>(draw)();
+    endCompile();
+    return true;
+  }
+  bool beginCompile(GLenum mode);
   void endCompile();
 
   GLName list_;
