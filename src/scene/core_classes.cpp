@@ -4,6 +4,7 @@
 #include "camera/rw_trackball.h"
 #include "camera/scene_camera.h"
 #include "geometry/geometry_classes.h"
+#include "import/ply_file.h"
 #include "platform/class_registry.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
@@ -21,6 +22,7 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<Sphere>("Sphere");
   registry.registerClass<Point3D>("Point3D");
   registry.registerClass<PointLayer>("PointLayer");
+  registry.registerClass<PLYFile>("PLYFile");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
   registry.registerClass<RWTrackball>("RWTrackball");

@@ -563,23 +563,29 @@ struct PlyReader {
   // Instances of one size, read a run at a time straight from the buffer:
   // each property with a callback is first decoded for the whole run (one
   // type dispatch per run, not per value), then the callbacks are called in
-  // file order. Properties without a callback are never touched.
+  // file order. Properties without a callback are never touched. Each
+  // property keeps its own argument, filled once, so a call costs only the
+  // stores of the instance index and the value.
   template <bool kSwap>
   bool readFixed(PlyElement& element, std::size_t instanceSize) {
     struct Step {
       std::size_t offset;
       Scalar scalar;
-      PlyProperty* property;
       p_ply_read_cb readCb;
-      void* pdata;
-      long idata;
+      PlyArgument argument;
     };
     std::vector<Step> steps;
     std::size_t offset = 0;
     for (const auto& property : element.properties) {
       if (property->readCb) {
-        steps.push_back({offset, kTypes[property->type].scalar, property.get(), property->readCb,
-                         property->pdata, property->idata});
+        Step& step = steps.emplace_back();
+        step.offset = offset;
+        step.scalar = kTypes[property->type].scalar;
+        step.readCb = property->readCb;
+        step.argument.element_ = &element;
+        step.argument.property_ = property.get();
+        step.argument.pdata_ = property->pdata;
+        step.argument.idata_ = property->idata;
       }
       offset += kTypes[property->type].size;
     }
@@ -587,8 +593,6 @@ struct PlyReader {
     constexpr long kRun = 256;
     const std::size_t stride = steps.size();
     std::vector<double> values(static_cast<std::size_t>(kRun) * stride);
-    PlyArgument argument;
-    argument.element_ = &element;
     long index = 0;
     while (index < element.ninstances) {
       if (!fill(instanceSize)) {
@@ -602,14 +606,11 @@ struct PlyReader {
       }
       const double* value = values.data();
       for (long i = 0; i < run; ++i) {
-        argument.instanceIndex_ = index + i;
-        for (const Step& step : steps) {
-          argument.property_ = step.property;
-          argument.pdata_ = step.pdata;
-          argument.idata_ = step.idata;
-          argument.value_ = *value++;
-          if (!step.readCb(&argument)) {
-            return aborted(argument);
+        for (Step& step : steps) {
+          step.argument.instanceIndex_ = index + i;
+          step.argument.value_ = *value++;
+          if (!step.readCb(&step.argument)) {
+            return aborted(step.argument);
           }
         }
       }

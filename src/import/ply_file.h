@@ -1,0 +1,42 @@
+#pragma once
+// The point layer made from a PLY file: the positions and colours of the
+// file's "vertex" element, read once into the layer's packed array when the
+// layer is made. From then on it is an ordinary inline point layer that
+// always has true colour and never writes itself back to a file; it archives
+// and copies exactly as a PointLayer does.
+
+#include <cstdint>
+#include <filesystem>
+#include <memory>
+#include <string_view>
+
+#include "scene/point_layer.h"
+
+namespace cloudreel {
+
+class PLYFile : public PointLayer {
+ public:
+  // A blank layer, as a document being decoded makes it.
+  PLYFile() = default;
+
+  // The layer of every `factor`-th vertex of the PLY file at `url` (a factor
+  // below 1 counts as 1), named after the file. Null when the file cannot be
+  // opened, its header cannot be read, the array cannot be had or the data
+  // cannot be read; the reader reports why on standard error ("RPly: ...").
+  static std::shared_ptr<PLYFile> initWithURLDownsample(const std::filesystem::path& url,
+                                                        std::int32_t factor);
+
+  std::string_view className() const override { return "PLYFile"; }
+
+  bool hasTrueColor() const override { return true; }
+  // Writes nothing and answers NO, which by the point file's inverted
+  // convention means it succeeded: the PLY file is never rewritten.
+  bool savePointsToURLError(const std::filesystem::path& url, Error* error) const override;
+  // Does nothing: the layer has no file of its own to save to.
+  void saveLinkedLayer() override {}
+
+ protected:
+  std::shared_ptr<Animatable3DObject> makeBlank() const override;
+};
+
+}  // namespace cloudreel
