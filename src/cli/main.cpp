@@ -1,8 +1,12 @@
-// The cloudreel command: headless front end of the application.
+// The cloudreel command: headless front end of the application. Results go
+// to standard output; progress, the core's log lines and failures go to
+// standard error, so `cloudreel info --json` output can be piped as is.
 
 #include <CLI/CLI.hpp>
-
 #include <cstdio>
+
+#include "cli/convert_command.h"
+#include "cli/info_command.h"
 
 int main(int argc, char** argv) {
   CLI::App app{
@@ -11,9 +15,20 @@ int main(int argc, char** argv) {
       "cloudreel"};
   app.set_version_flag("--version", std::string("cloudreel ") + CLOUDREEL_VERSION);
   app.footer("Run 'cloudreel COMMAND --help' for the options of a command.");
+  app.require_subcommand(0, 1);
+
+  cloudreel::cli::InfoOptions info;
+  const CLI::App* infoCommand = cloudreel::cli::addInfoCommand(app, info);
+  cloudreel::cli::ConvertOptions convert;
+  const CLI::App* convertCommand = cloudreel::cli::addConvertCommand(app, convert);
+
   CLI11_PARSE(app, argc, argv);
-  if (argc <= 1) {
-    std::fputs(app.help().c_str(), stdout);
+  if (infoCommand->parsed()) {
+    return cloudreel::cli::runInfoCommand(info);
   }
+  if (convertCommand->parsed()) {
+    return cloudreel::cli::runConvertCommand(convert);
+  }
+  std::fputs(app.help().c_str(), stdout);
   return 0;
 }

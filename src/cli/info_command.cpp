@@ -1,0 +1,122 @@
+#include "cli/info_command.h"
+
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <nlohmann/json.hpp>
+
+#include "cli/point_cloud_input.h"
+#include "cli/point_cloud_summary.h"
+#include "scene/point_layer.h"
+
+namespace cloudreel::cli {
+
+namespace {
+
+nlohmann::ordered_json toJson(const std::string& file, const PointCloudSummary& summary) {
+  nlohmann::ordered_json json = {
+      {"file", file},           {"points", summary.points},
+      {"faces", summary.faces}, {"hasNormals", summary.hasNormals},
+      {"bbox", summary.bbox},   {"luckHistogram", summary.luckHistogram},
+  };
+  if (summary.ply) {
+    nlohmann::ordered_json elements = nlohmann::ordered_json::array();
+    for (const PlyElementDescription& element : summary.ply->elements) {
+      nlohmann::ordered_json properties = nlohmann::ordered_json::array();
+      for (const PlyPropertyDescription& property : element.properties) {
+        properties.push_back({{"name", property.name}, {"type", property.type}});
+      }
+      elements.push_back(
+          {{"name", element.name}, {"count", element.count}, {"properties", properties}});
+    }
+    json["ply"] = {{"format", summary.ply->format}, {"elements", elements}};
+  }
+  return json;
+}
+
+std::string toText(const std::string& file, const PointCloudSummary& summary) {
+  std::string text = fmt::format("{}: {} points, {} faces, {}-byte records {} normals\n", file,
+                                 summary.points, summary.faces, summary.hasNormals ? 28 : 16,
+                                 summary.hasNormals ? "with" : "without");
+  const Layer::BoundingBox& b = summary.bbox;
+  text += fmt::format("bounding box: x {:g} .. {:g}, y {:g} .. {:g}, z {:g} .. {:g}\n", b[0], b[3],
+                      b[1], b[4], b[2], b[5]);
+  // Sixteen groups of sixteen luck values, four groups a line.
+  text += "luck histogram (points per 16 luck values):\n";
+  for (int group = 0; group < 16; ++group) {
+    std::uint64_t sum = 0;
+    for (int luck = group * 16; luck < group * 16 + 16; ++luck) {
+      sum += summary.luckHistogram[static_cast<std::size_t>(luck)];
+    }
+    text += fmt::format("  {:>3}-{:<3} {:>10}", group * 16, group * 16 + 15, sum);
+    text += group % 4 == 3 ? "\n" : "";
+  }
+  if (summary.ply) {
+    text += fmt::format("PLY header, format {}:\n", summary.ply->format);
+    for (const PlyElementDescription& element : summary.ply->elements) {
+      text += fmt::format("  element {} {}\n", element.name, element.count);
+      for (const PlyPropertyDescription& property : element.properties) {
+        text += fmt::format("    property {} {}\n", property.type, property.name);
+      }
+    }
+  }
+  return text;
+}
+
+}  // namespace
+
+CLI::App* addInfoCommand(CLI::App& app, InfoOptions& options) {
+  CLI::App* command =
+      app.add_subcommand("info", "Describe the point layer a .rwb or .ply file opens as.");
+  command->add_option("FILE", options.file, "a .rwb point file or a .ply file")->required();
+  command->add_flag("--json", options.json, "print one JSON object instead of text");
+  command->footer(
+      "The JSON object has \"file\", \"points\", \"faces\", \"hasNormals\" (28-byte records with "
+      "normals), \"bbox\" ([minX, minY, minZ, maxX, maxY, maxZ]) and \"luckHistogram\" (256 "
+      "counts of records by luck value); for a PLY file also \"ply\": {\"format\", \"elements\": "
+      "[{\"name\", \"count\", \"properties\": [{\"name\", \"type\"}]}]}, where a list property's "
+      "type reads \"list <length type> <value type>\", e.g. \"list uchar int\".\n"
+      "A PLY file is described as imported: every vertex, positions and colours only.");
+  return command;
+}
+
+int runInfoCommand(const InfoOptions& options) {
+  const std::filesystem::path path = options.file;
+  const PointFileKind kind = pointFileKind(path);
+  std::optional<PlyHeaderDescription> header;
+  if (kind == PointFileKind::Ply) {
+    // The header is read first and on its own, so a file that is no PLY at
+    // all is reported with the reader's reason before any import starts.
+    Error error;
+    PlyHeaderDescription described;
+    if (!checkReadable(path, &error)) {
+      reportFailure(error.message);
+      return 1;
+    }
+    if (!describePlyHeader(path, &described, &error)) {
+      reportFailure(fmt::format("cannot read the PLY header of {}", error.message));
+      return 1;
+    }
+    header = std::move(described);
+  }
+
+  Error error;
+  const std::shared_ptr<PointLayer> layer = openPointCloud(path, kind, 1, &error);
+  if (!layer) {
+    reportFailure(error.message);
+    return 1;
+  }
+  PointCloudSummary summary = summarizePointLayer(*layer);
+  summary.ply = std::move(header);
+
+  const std::string out =
+      options.json ? toJson(options.file, summary).dump() + "\n" : toText(options.file, summary);
+  if (std::fputs(out.c_str(), stdout) < 0 || std::fflush(stdout) != 0) {
+    reportFailure("cannot write to standard output");
+    return 1;
+  }
+  return 0;
+}
+
+}  // namespace cloudreel::cli

@@ -1,0 +1,43 @@
+#pragma once
+// Opening a point file from the command line, shared by the commands: what
+// kind of file a name is, the layer the file opens as, and failures told as
+// one line naming the file.
+
+#include <cstdint>
+#include <filesystem>
+#include <memory>
+#include <string_view>
+
+#include "platform/error.h"
+
+namespace cloudreel {
+class PointLayer;
+}
+
+namespace cloudreel::cli {
+
+enum class PointFileKind { Unknown, PointFile, Ply };
+
+// By extension, in any case: ".rwb" or ".ply".
+PointFileKind pointFileKind(const std::filesystem::path& path);
+
+// Writes "cloudreel: <message>" as one line on standard error.
+void reportFailure(std::string_view message);
+
+// Answers whether the file is there and can be read; if not, the error says
+// why ("cannot open x.ply: No such file or directory"). A layer must not be
+// sent looking for a missing point file: it would try the point cache
+// folder and an open panel.
+[[nodiscard]] bool checkReadable(const std::filesystem::path& path, Error* error);
+
+// The layer the file opens as: a point layer loaded from a ".rwb" file, or
+// the PLYFile layer of every `downsample`-th vertex of a ".ply" file. Large
+// files get a stage line on standard error first. Null on failure, with the
+// error's message saying what failed on which file ("cannot read points
+// from x.rwb: Cannot read points: short read"); whatever the core or the
+// PLY reader printed on the way is then held back, so that message is the
+// only line a caller needs to print.
+std::shared_ptr<PointLayer> openPointCloud(const std::filesystem::path& path, PointFileKind kind,
+                                           std::int32_t downsample, Error* error);
+
+}  // namespace cloudreel::cli

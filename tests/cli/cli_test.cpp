@@ -1,0 +1,237 @@
+// The cloudreel command run as a user runs it: files written into a
+// temporary folder, the built program started on them, its exit status,
+// standard output and standard error examined.
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <spawn.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <bit>
+#include <cstdint>
+#include <cstring>
+#include <fstream>
+#include <nlohmann/json.hpp>
+#include <set>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "support/temp_dir.h"
+
+extern char** environ;
+
+namespace {
+
+using cloudreel::testing::TempDir;
+namespace fs = std::filesystem;
+
+struct Outcome {
+  int status = -1;
+  std::string out;
+  std::string err;
+};
+
+std::string readFile(const fs::path& path) {
+  std::ifstream in(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+}
+
+void writeFile(const fs::path& path, const std::string& bytes) {
+  std::ofstream(path, std::ios::binary) << bytes;
+}
+
+// Runs cloudreel in `dir` with its output streams in files kept outside it,
+// so the folder holds only what the command itself leaves there.
+Outcome cloudreel(const TempDir& dir, std::vector<std::string> args) {
+  static const TempDir streams;
+  args.insert(args.begin(), CLOUDREEL_BINARY);
+  std::vector<char*> argv;
+  for (std::string& arg : args) {
+    argv.push_back(arg.data());
+  }
+  argv.push_back(nullptr);
+  posix_spawn_file_actions_t actions;
+  posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_addchdir_np(&actions, dir.path().c_str());
+  const std::string out = streams / "out", err = streams / "err";
+  posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+  posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+  Outcome run;
+  pid_t pid = 0;
+  int waitStatus = 0;
+  if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0 &&
+      waitpid(pid, &waitStatus, 0) == pid && WIFEXITED(waitStatus)) {
+    run.status = WEXITSTATUS(waitStatus);
+  }
+  posix_spawn_file_actions_destroy(&actions);
+  run.out = readFile(out);
+  run.err = readFile(err);
+  return run;
+}
+
+nlohmann::json infoJson(const TempDir& dir, const std::string& file) {
+  const Outcome run = cloudreel(dir, {"info", file, "--json"});
+  EXPECT_EQ(run.status, 0) << run.err;
+  return nlohmann::json::parse(run.out, nullptr, false);
+}
+
+// A cloud of n vertices, vertex i at (i, -i/2, i % 7), and two faces, in
+// the given PLY format.
+std::string plyCloud(int n, const std::string& format) {
+  std::ostringstream out;
+  out << "ply\nformat " << format << " 1.0\nelement vertex " << n
+      << "\nproperty float x\nproperty float y\nproperty float z\n"
+         "property uchar red\nproperty uchar green\nproperty uchar blue\n"
+         "element face 2\nproperty list uchar int vertex_indices\nend_header\n";
+  auto put = [&](auto value) {
+    if (format == "ascii") {
+      out << +value << ' ';
+      return;
+    }
+    char bytes[sizeof value];
+    std::memcpy(bytes, &value, sizeof value);
+    if ((format == "binary_big_endian") != (std::endian::native == std::endian::big)) {
+      std::reverse(bytes, bytes + sizeof value);
+    }
+    out.write(bytes, sizeof value);
+  };
+  for (int i = 0; i < n; ++i) {
+    put(float(i)), put(float(-0.5 * i)), put(float(i % 7));
+    put(std::uint8_t(i)), put(std::uint8_t(2 * i)), put(std::uint8_t(3 * i));
+  }
+  for (int face = 0; face < 2; ++face) {
+    put(std::uint8_t(3)), put(face), put(face + 1), put(face + 2);
+  }
+  return out.str();
+}
+
+// A point file: 88-byte header and box, records of 16 bytes (28 with
+// normals) whose last byte is the luck, then the faces' indices.
+std::string pointFile(const std::vector<std::uint8_t>& lucks, bool normals, std::uint32_t faces) {
+  std::string bytes(88, '\0');
+  const std::uint32_t count = static_cast<std::uint32_t>(lucks.size());
+  std::memcpy(bytes.data(), "RWBP", 4);
+  std::memcpy(bytes.data() + 12, &count, 4);
+  std::memcpy(bytes.data() + 20, &faces, 4);
+  bytes[24] = normals ? 1 : 0;
+  const double box[6] = {-1, -2, -3, 4, 5, 6};
+  std::memcpy(bytes.data() + 40, box, sizeof box);
+  for (std::uint8_t luck : lucks) {
+    bytes.append(normals ? 27 : 15, '\0').push_back(static_cast<char>(luck));
+  }
+  return bytes.append(faces * 12, '\0');
+}
+
+TEST(CliInfo, DescribesPlyFilesInEveryFormatAsTheirImportedLayer) {
+  TempDir dir;
+  for (const std::string format : {"ascii", "binary_little_endian", "binary_big_endian"}) {
+    SCOPED_TRACE(format);
+    writeFile(dir / "cloud.ply", plyCloud(300, format));
+    const nlohmann::json info = infoJson(dir, "cloud.ply");
+    EXPECT_EQ(info["points"], 300);
+    EXPECT_EQ(info["faces"], 0);  // the import reads vertices only
+    EXPECT_EQ(info["hasNormals"], false);
+    EXPECT_EQ(info["bbox"], nlohmann::json({0.0, -149.5, 0.0, 299.0, 0.0, 6.0}));
+    // Luck numbers the records 0-255 over and over.
+    const auto histogram = info["luckHistogram"].get<std::vector<int>>();
+    ASSERT_EQ(histogram.size(), 256u);
+    EXPECT_EQ(histogram[0], 2);
+    EXPECT_EQ(histogram[43], 2);
+    EXPECT_EQ(histogram[44], 1);
+    EXPECT_EQ(std::count(histogram.begin(), histogram.end(), 2), 44);
+    EXPECT_EQ(info["ply"]["format"], format);
+    const nlohmann::json& elements = info["ply"]["elements"];
+    ASSERT_EQ(elements.size(), 2u);
+    EXPECT_EQ(elements[0]["name"], "vertex");
+    EXPECT_EQ(elements[0]["count"], 300);
+    EXPECT_EQ(elements[0]["properties"][5], nlohmann::json({{"name", "blue"}, {"type", "uchar"}}));
+    EXPECT_EQ(elements[1]["name"], "face");
+    EXPECT_EQ(elements[1]["count"], 2);
+    EXPECT_EQ(elements[1]["properties"][0],
+              nlohmann::json({{"name", "vertex_indices"}, {"type", "list uchar int"}}));
+  }
+  const Outcome text = cloudreel(dir, {"info", "cloud.ply"});
+  EXPECT_EQ(text.status, 0);
+  EXPECT_NE(text.out.find("cloud.ply: 300 points, 0 faces"), std::string::npos) << text.out;
+  EXPECT_NE(text.out.find("property list uchar int vertex_indices"), std::string::npos);
+}
+
+TEST(CliInfo, DescribesPointFilesWithEitherRecordLayout) {
+  TempDir dir;
+  writeFile(dir / "plain.rwb", pointFile({7, 7, 200}, false, 0));
+  writeFile(dir / "NORMALS.RWB", pointFile({1, 2, 2}, true, 1));
+  const nlohmann::json plain = infoJson(dir, "plain.rwb");
+  EXPECT_EQ(plain["points"], 3);
+  EXPECT_EQ(plain["hasNormals"], false);
+  EXPECT_EQ(plain["bbox"], nlohmann::json({-1.0, -2.0, -3.0, 4.0, 5.0, 6.0}));
+  EXPECT_EQ(plain["luckHistogram"][7], 2);
+  EXPECT_EQ(plain["luckHistogram"][200], 1);
+  EXPECT_FALSE(plain.contains("ply"));
+  const nlohmann::json normals = infoJson(dir, "NORMALS.RWB");
+  EXPECT_EQ(normals["points"], 3);
+  EXPECT_EQ(normals["faces"], 1);
+  EXPECT_EQ(normals["hasNormals"], true);
+  EXPECT_EQ(normals["luckHistogram"][1], 1);
+  EXPECT_EQ(normals["luckHistogram"][2], 2);
+}
+
+TEST(CliConvert, WritesAPointFileThatOpensAsTheSameCloud) {
+  TempDir dir;
+  writeFile(dir / "scan.PLY", plyCloud(300, "binary_little_endian"));
+  ASSERT_EQ(cloudreel(dir, {"convert", "scan.PLY", "scan.rwb"}).status, 0);
+  const nlohmann::json source = infoJson(dir, "scan.PLY");
+  const nlohmann::json converted = infoJson(dir, "scan.rwb");
+  for (const char* key : {"points", "faces", "hasNormals", "bbox", "luckHistogram"}) {
+    EXPECT_EQ(converted[key], source[key]) << key;
+  }
+
+  const Outcome halved = cloudreel(dir, {"convert", "scan.PLY", "half.rwb", "--downsample", "2"});
+  ASSERT_EQ(halved.status, 0) << halved.err;
+  EXPECT_EQ(halved.out, "");
+  EXPECT_EQ(infoJson(dir, "half.rwb")["points"], 150);
+}
+
+TEST(CliCommands, RefuseBadInputWithOneLineNamingTheFileAndLeaveNoOutput) {
+  TempDir dir;
+  writeFile(dir / "cloud.ply", plyCloud(10, "ascii"));
+  writeFile(dir / "garbage.ply", "this is not a point cloud\n");
+  std::string badValue = plyCloud(10, "ascii");
+  badValue.replace(badValue.find(" 4 -2 4 "), 8, " 4 -2 x ");
+  writeFile(dir / "bad-value.ply", badValue);
+  const std::string points = pointFile({1, 2, 3, 4}, false, 0);
+  writeFile(dir / "truncated.rwb", points.substr(0, points.size() - 20));
+  const std::set<fs::path> inputs(fs::directory_iterator(dir.path()), fs::directory_iterator());
+
+  const struct {
+    std::vector<std::string> args;
+    std::string named;
+  } cases[] = {
+      {{"info", "missing.ply"}, "missing.ply"},
+      {{"info", "missing.rwb"}, "missing.rwb"},
+      {{"info", "garbage.ply"}, "garbage.ply"},
+      {{"info", "bad-value.ply"}, "bad-value.ply"},
+      {{"info", "truncated.rwb", "--json"}, "truncated.rwb: Cannot read points: short read"},
+      {{"info", "notes.txt"}, "notes.txt"},
+      {{"convert", "garbage.ply", "out.rwb"}, "garbage.ply"},
+      {{"convert", "bad-value.ply", "out.rwb"}, "bad-value.ply"},
+      {{"convert", "missing.ply", "out.rwb"}, "missing.ply"},
+      {{"convert", "cloud.ply", "out.txt"}, "out.txt"},
+      {{"convert", "truncated.rwb", "out.rwb"}, "truncated.rwb"},
+      {{"convert", "cloud.ply", "no-folder/out.rwb"}, "no-folder/out.rwb"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args[0] + " " + c.args[1]);
+    const Outcome run = cloudreel(dir, c.args);
+    EXPECT_NE(run.status, 0);
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
+    EXPECT_EQ(run.err.rfind("cloudreel: ", 0), 0u) << run.err;
+    EXPECT_NE(run.err.find(c.named), std::string::npos) << run.err;
+  }
+  const std::set<fs::path> after(fs::directory_iterator(dir.path()), fs::directory_iterator());
+  EXPECT_EQ(after, inputs);
+}
+
+}  // namespace
