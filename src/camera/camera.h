@@ -43,7 +43,8 @@ class Camera : public Animatable3DObject {
 
   bool selected() const { return selected_; }
   float aspect() const { return aspect_; }            // width over height
-  float fieldOfView() const { return fieldOfView_; }  // degrees
+  // Degrees. Virtual because a source camera derives it from its photograph.
+  virtual float fieldOfView() const { return fieldOfView_; }
   const std::string& name() const { return name_; }
   float zNear() const { return zNear_; }
   float zFar() const { return zFar_; }
@@ -61,6 +62,16 @@ class Camera : public Animatable3DObject {
   virtual float fieldOfViewInRadians() const;
   // The camera's index in its source file; 0 for a camera of no file.
   virtual int number() const { return 0; }
+
+  // Whether the camera has a photograph to show at the end of its frustum
+  // (drawImageWithFrustumLength); camera paths ask before drawing one.
+  virtual bool canDrawImage() const { return false; }
+  // Draws the camera's photograph `length` along its view at `opacity`;
+  // nothing for a camera without one.
+  virtual void drawImageWithFrustumLength(float length, float opacity) {
+    (void)length;
+    (void)opacity;
+  }
 
   // Sets the rotation of inertialToObject from {scalar, x, y, z}.
   void setMatrixFromQuaternion(const std::array<double, 4>& q);

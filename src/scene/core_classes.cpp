@@ -1,9 +1,17 @@
 #include "scene/core_classes.h"
 
+#include "camera/bundler_camera.h"
 #include "camera/camera.h"
+#include "camera/camera_field.h"
+#include "camera/discrete_camera_path.h"
 #include "camera/rw_trackball.h"
 #include "camera/scene_camera.h"
+#include "camera/slerp_camera_path.h"
+#include "camera/source_camera.h"
+#include "camera/transform_stack.h"
+#include "camera/zxy_camera_path.h"
 #include "geometry/geometry_classes.h"
+#include "import/bundler_file.h"
 #include "import/ply_file.h"
 #include "platform/class_registry.h"
 #include "scene/layer.h"
@@ -23,9 +31,18 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<Point3D>("Point3D");
   registry.registerClass<PointLayer>("PointLayer");
   registry.registerClass<PLYFile>("PLYFile");
+  registry.registerClass<BundlerFile>("BundlerFile");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
+  registry.registerClass<SourceCamera>("SourceCamera");
+  registry.registerClass<BundlerCamera>("BundlerCamera");
   registry.registerClass<RWTrackball>("RWTrackball");
+  registry.registerClass<DiscreteCameraPath>("DiscreteCameraPath");
+  registry.registerClass<ZXYCameraPath>("ZXYCameraPath");
+  registry.registerClass<SLERPCameraPath>("SLERPCameraPath");
+  registry.registerClass<CameraField>("CameraField");
+  registry.registerClass<TransformStack>("TransformStack");
+  registry.registerClass<TransformStackMember>("TransformStackMember");
 }
 
 }  // namespace cloudreel

@@ -122,7 +122,9 @@ class PointLayer : public Layer {
   // result: a load that reads fewer records than the file's count answers
   // NO and yet stores "Cannot read points: short read".
   virtual bool savePointsToURLError(const std::filesystem::path& url, Error* error) const;
-  bool loadPointsFromURLError(const std::filesystem::path& url, Error* error);
+  // Virtual so that a linked layer of another file kind (a bundle file)
+  // reloads through its own reader when the document is opened.
+  virtual bool loadPointsFromURLError(const std::filesystem::path& url, Error* error);
   // The file to read for `url`: the file itself, else the file of the same
   // name in the point cache folder ("KTPointCachePath"), else one the user
   // locates; null when the user cancels.

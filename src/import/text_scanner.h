@@ -1,0 +1,58 @@
+#pragma once
+// Reads a text file the way the reconstruction formats are meant to be read
+// with fgets and scanf, but from a stream and with every read bounded: line
+// reads take at most 511 characters (a 512-byte line buffer), and numbers
+// are whitespace-separated fields.
+//
+// Unlike scanf, a field is always consumed whole: its leading number is the
+// value ("12.5abc" reads as 12.5 for a float, 12 for an integer) and a field
+// with no leading number reads as 0. So a damaged file can never stall the
+// reading, and every value read is defined.
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+namespace cloudreel {
+
+class InputStream;
+
+class TextScanner {
+ public:
+  // Reads `in` from its current position; the stream must outlive the
+  // scanner.
+  explicit TextScanner(InputStream& in);
+
+  // Consumes up to and including the next newline, but never more than 511
+  // characters (the rest of a longer line is left for the next read).
+  // Answers NO when nothing was left to read.
+  bool readLine();
+
+  // The next field as a number. At the end of the text the target is left
+  // as it is and the answer is NO; a field without a leading number stores
+  // 0 and answers NO. A number beyond the type's range stores the nearest
+  // end of the range for integers and 0 for floating point.
+  bool scan(std::int64_t& value);
+  bool scan(float& value);
+  bool scan(double& value);
+
+  // Skips white space and answers whether any text remains.
+  bool atEnd();
+  // Bytes not yet consumed.
+  std::uint64_t remainingBytes() const;
+
+ private:
+  bool fill();
+  int peek();
+  // The next field, its first 511 characters kept in field_; false at end.
+  bool nextField();
+
+  InputStream& in_;
+  std::vector<char> buffer_;
+  std::size_t next_ = 0;
+  std::size_t end_ = 0;
+  char field_[512] = {};
+  std::size_t fieldLength_ = 0;
+};
+
+}  // namespace cloudreel
