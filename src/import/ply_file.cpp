@@ -1,6 +1,5 @@
 #include "import/ply_file.h"
 
-#include <sys/mman.h>
 #if defined(__x86_64__)
 #include <emmintrin.h>
 #endif
@@ -136,25 +135,6 @@ int storeVertexValue(p_ply_argument argument) {
   return 1;
 }
 
-// Asks for the array in 2 MiB pages where the system offers them: filling a
-// fresh array page by page otherwise takes a fault every 4 KiB, about a
-// fifth of the import's time. Only whole huge pages inside the array are
-// advised, and a refusal changes nothing.
-void adviseHugePages(void* data, std::size_t bytes) {
-#if defined(MADV_HUGEPAGE)
-  constexpr std::uintptr_t kHugePage = std::uintptr_t{1} << 21;
-  const auto start = reinterpret_cast<std::uintptr_t>(data);
-  const std::uintptr_t begin = (start + kHugePage - 1) & ~(kHugePage - 1);
-  const std::uintptr_t end = (start + bytes) & ~(kHugePage - 1);
-  if (end > begin) {
-    (void)madvise(reinterpret_cast<void*>(begin), end - begin, MADV_HUGEPAGE);
-  }
-#else
-  (void)data;
-  (void)bytes;
-#endif
-}
-
 }  // namespace
 
 std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::path& url,
@@ -206,7 +186,6 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   if (points == nullptr) {
     return nullptr;
   }
-  adviseHugePages(points, layer->pointArray()->size());
   context.points = points;
   context.capacity = static_cast<std::int32_t>(n);
   if (n > 0) {

@@ -204,6 +204,9 @@ bool FileInputStream::read(void* data, std::size_t size) {
   if (size > size_ - position_) {
     return false;
   }
+  if (size == 0) {
+    return true;  // an empty read may carry a null pointer, which memcpy must not see
+  }
   auto* out = static_cast<std::uint8_t*>(data);
   // Whatever the buffer already holds from the current position.
   if (position_ >= bufferStart_ && position_ < bufferStart_ + bufferLength_) {

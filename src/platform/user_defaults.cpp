@@ -89,7 +89,10 @@ DefaultsDictionary FileDefaultsStore::load(Error* error) {
 bool FileDefaultsStore::save(const DefaultsDictionary& values, Error* error) {
   MemoryOutputStream out;
   KeyedArchiver archiver(out);
-  for (const auto& [key, value] : values) {
+  for (const auto& [name, value] : values) {
+    // A named reference, not the binding itself: clang before 16 cannot
+    // capture a structured binding in a lambda.
+    const auto& key = name;
     std::visit(
         [&archiver, &key](const auto& v) {
           using T = std::decay_t<decltype(v)>;

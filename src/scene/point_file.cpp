@@ -126,8 +126,12 @@ bool PointLayer::loadPointsFromURLError(const std::filesystem::path& url, Error*
   const std::uint64_t readable = std::min<std::uint64_t>(
       {announcedPoints, available, std::numeric_limits<std::int32_t>::max()});
   const bool shortRead = readable < announcedPoints;
-  nFaces_ = static_cast<std::int32_t>(std::min<std::uint32_t>(
-      faces, static_cast<std::uint32_t>(std::numeric_limits<std::int32_t>::max())));
+  // The old triangles index the old records and go with them; the face
+  // count comes back only with the triangles the file really holds. So a
+  // load that fails from here on leaves points without faces, never a face
+  // count with no triangles behind it.
+  triangles_.clear();
+  nFaces_ = 0;
   setNPoints(static_cast<std::int32_t>(readable));
   if (allocatePointArrayWithSize(nPoints_) == nullptr) {
     return fail(error, "Cannot allocate memory for points");
@@ -149,7 +153,6 @@ bool PointLayer::loadPointsFromURLError(const std::filesystem::path& url, Error*
     (void)fail(error, "Cannot read points: short read");
   }
 
-  triangles_.clear();
   if (faces != 0) {
     // The triangles are read unchecked: the indices the file holds. The
     // array is never larger than the file could fill, and the face count

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <fstream>
 #include <iterator>
@@ -160,6 +161,52 @@ TEST_F(PointLayerTest, TheNormalsFlagSelects28ByteRecords) {
   ASSERT_EQ(layer.nPoints(), 2);
   EXPECT_EQ(layer.pointArray()->size(), 56u);
   EXPECT_EQ(std::memcmp(layer.points(), file.data() + 88, 56), 0);
+}
+
+TEST_F(PointLayerTest, ALargeArrayIsZeroedToItsLastRecord) {
+  // 48 MB: large enough to be mapped in huge pages rather than taken from
+  // the heap, which must not change what the layer sees.
+  constexpr std::int32_t n = 3'000'000;
+  PointLayer layer;
+  const std::uint8_t* data = layer.allocatePointArrayWithSize(n);
+  ASSERT_NE(data, nullptr);
+  ASSERT_EQ(layer.pointArray()->size(), std::size_t{n} * 16);
+  EXPECT_EQ(std::find_if(data, data + std::size_t{n} * 16, [](std::uint8_t b) { return b != 0; }),
+            data + std::size_t{n} * 16);
+  // Replacing it releases it the way it was taken (under ASan, giving a
+  // mapping to the heap's free would be reported).
+  EXPECT_NE(layer.allocatePointArrayWithSize(3), nullptr);
+}
+
+TEST_F(PointLayerTest, AFaceCountBeyondTheFileKeepsTheWholeFacesThatAreThere) {
+  Bytes file = readAll(saved(*layerOf(3)));
+  file[20] = 2;
+  // Fewer bytes than one face: no triangles, and nothing is read into the
+  // empty list (the loader once passed its null data to the stream).
+  const struct {
+    std::size_t indexBytes;
+    int faces;
+  } cases[] = {{4, 0}, {12, 1}, {20, 1}, {24, 2}};
+  for (const auto& c : cases) {
+    Bytes withFaces = file;
+    for (std::size_t i = 0; i < c.indexBytes; ++i) {
+      withFaces.push_back(static_cast<std::uint8_t>(i / 4));
+    }
+    writeAll(dir / "faces.rwb", withFaces);
+    PointLayer layer;
+    Error error;
+    layer.loadPointsFromURLError(dir / "faces.rwb", &error);
+    EXPECT_EQ(error.message, "") << c.indexBytes;
+    EXPECT_EQ(layer.nFaces(), c.faces) << c.indexBytes;
+    EXPECT_EQ(layer.triangles().size(), std::size_t(3 * c.faces)) << c.indexBytes;
+  }
+  // A load that fails before the triangles claims no faces either.
+  writeAll(dir / "faces.rwb", Bytes(file.begin(), file.begin() + 60));
+  PointLayer cut;
+  Error error;
+  cut.loadPointsFromURLError(dir / "faces.rwb", &error);
+  EXPECT_EQ(error.message, "Cannot read bounding box");
+  EXPECT_EQ(cut.nFaces(), 0);
 }
 
 TEST_F(PointLayerTest, AMissingFileIsTakenFromTheCacheOrLocatedByTheUser) {

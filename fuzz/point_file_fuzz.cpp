@@ -1,0 +1,72 @@
+// Feeds arbitrary bytes to the point-file loader: the bytes are written to a
+// file, a fresh point layer loads it, and every byte of the records and every
+// triangle index the layer then claims to hold is read. The loader must
+// refuse or cut short what the file cannot back, without a crash, a leak,
+// undefined behaviour or an allocation the file's size does not justify.
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+
+#include "platform/application_defaults.h"
+#include "platform/log.h"
+#include "platform/user_defaults.h"
+#include "scene/point_layer.h"
+#include "scratch_file.h"
+
+namespace {
+
+using namespace cloudreel;
+
+fuzz::ScratchFile& pointFile() {
+  static fuzz::ScratchFile file("point_file_fuzz.rwb");
+  return file;
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerInitialize(int*, char***) {
+  // The factory settings in memory, so no user's configuration is read, and
+  // a silent log: the loader logs every face count and every freed layer.
+  auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
+  registerApplicationDefaults(*defaults);
+  UserDefaults::setStandardUserDefaults(std::move(defaults));
+  setLogSink([](std::string_view) {});
+  (void)pointFile();
+  return 0;
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  pointFile().write(data, size);
+  auto layer = std::make_shared<PointLayer>();
+  Error error;
+  (void)layer->loadPointsFromURLError(pointFile().path(), &error);
+
+  // What the layer claims must lie inside what it holds: ASan reports any
+  // byte read past the array or the triangle list.
+  std::uint64_t sum = 0;
+  const std::uint8_t* points = layer->points();
+  if (points != nullptr && layer->nPoints() > 0) {
+    const std::size_t bytes = static_cast<std::size_t>(layer->nPoints()) * layer->recordSize();
+    for (std::size_t i = 0; i < bytes; ++i) {
+      sum += points[i];
+    }
+  }
+  for (const color_point& point : layer->colorPoints()) {
+    sum += point.luck;
+  }
+  const std::size_t indices = static_cast<std::size_t>(layer->nFaces()) * 3;
+  if (indices > layer->triangles().size()) {
+    std::fprintf(stderr, "point_file_fuzz: %d faces but %zu indices\n", layer->nFaces(),
+                 layer->triangles().size());
+    std::abort();
+  }
+  for (std::size_t i = 0; i < indices; ++i) {
+    sum += layer->triangles()[i];
+  }
+  volatile std::uint64_t sink = sum;
+  (void)sink;
+  return 0;
+}
