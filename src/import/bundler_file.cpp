@@ -14,7 +14,6 @@
 #include "platform/file_location.h"
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
-#include "platform/user_interaction.h"
 
 namespace cloudreel {
 
@@ -70,16 +69,7 @@ std::int64_t clampedToInt32(std::int64_t v) {
 std::shared_ptr<BundlerFile> BundlerFile::initWithURLShouldLink(const std::filesystem::path& url,
                                                                 bool shouldLink) {
   auto layer = std::make_shared<BundlerFile>();
-  layer->setOriginalURL(url);
-  layer->setFileStoredAsLink(shouldLink);
-  layer->setName(lastPathComponent(url));
-  Error error;
-  (void)layer->loadPointsFromURLError(url, &error);
-  if (!error.message.empty()) {
-    UserInteraction::shared().presentError(error);
-    return nullptr;
-  }
-  return layer;
+  return layer->loadFromURL(url, shouldLink) ? layer : nullptr;
 }
 
 bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error* error) {

@@ -103,16 +103,20 @@ PointLayer::~PointLayer() { logf("deallocing point layer"); }
 std::shared_ptr<PointLayer> PointLayer::initWithURLShouldLink(const std::filesystem::path& url,
                                                               bool shouldLink) {
   auto layer = std::make_shared<PointLayer>();
-  layer->setOriginalURL(url);
-  layer->setFileStoredAsLink(shouldLink);
-  layer->setName(lastPathComponent(url));
+  return layer->loadFromURL(url, shouldLink) ? layer : nullptr;
+}
+
+bool PointLayer::loadFromURL(const std::filesystem::path& url, bool shouldLink) {
+  setOriginalURL(url);
+  setFileStoredAsLink(shouldLink);
+  setName(lastPathComponent(url));
   Error error;
-  (void)layer->loadPointsFromURLError(url, &error);
+  (void)loadPointsFromURLError(url, &error);
   if (!error.message.empty()) {
     UserInteraction::shared().presentError(error);
-    return nullptr;
+    return false;
   }
-  return layer;
+  return true;
 }
 
 const PropertyTable& PointLayer::properties() const {

@@ -231,6 +231,10 @@ class PointLayer : public Layer {
   // drawing are not copied: the copy draws as a plain coloured cloud.
   void copyInto(Animatable3DObject& target) const override;
 
+  // Links the layer to `url` (or not), names it after the file and loads
+  // it through the layer's own reader; a load error is presented to the
+  // user and answers false.
+  bool loadFromURL(const std::filesystem::path& url, bool shouldLink);
   void setPointArray(std::shared_ptr<PointArray> array, std::int32_t count);
   // Call after changing records in place, so that a drawing built later
   // does not reuse points uploaded before.
