@@ -32,6 +32,26 @@ nlohmann::ordered_json toJson(const std::string& file, const PointCloudSummary& 
     }
     json["ply"] = {{"format", summary.ply->format}, {"elements", elements}};
   }
+  if (summary.bundle) {
+    json["bundle"] = {{"cameras", summary.bundle->cameras}, {"points", summary.bundle->points}};
+  }
+  if (summary.cameras) {
+    nlohmann::ordered_json cameras = nlohmann::ordered_json::array();
+    for (const CameraDescription& camera : *summary.cameras) {
+      nlohmann::ordered_json image = nullptr;
+      if (camera.image) {
+        image = {{"width", (*camera.image)[0]}, {"height", (*camera.image)[1]}};
+      }
+      cameras.push_back({{"index", camera.index},
+                         {"focal", camera.focal},
+                         {"k1", camera.k1},
+                         {"k2", camera.k2},
+                         {"centre", camera.centre},
+                         {"fieldOfView", camera.fieldOfView},
+                         {"image", image}});
+    }
+    json["cameras"] = cameras;
+  }
   return json;
 }
 
@@ -61,23 +81,46 @@ std::string toText(const std::string& file, const PointCloudSummary& summary) {
       }
     }
   }
+  if (summary.bundle) {
+    text += fmt::format("bundle header: {} cameras, {} points\n", summary.bundle->cameras,
+                        summary.bundle->points);
+  }
+  if (summary.cameras) {
+    text += fmt::format("{} cameras:\n", summary.cameras->size());
+    for (const CameraDescription& camera : *summary.cameras) {
+      const auto& c = camera.centre;
+      text +=
+          fmt::format("  {:>4}: focal {:g}, centre ({:g}, {:g}, {:g}), field of view {:.2f} deg, ",
+                      camera.index, camera.focal, c[0], c[1], c[2], camera.fieldOfView);
+      text += camera.image
+                  ? fmt::format("photograph {}x{}\n", (*camera.image)[0], (*camera.image)[1])
+                  : std::string("no photograph\n");
+    }
+  }
   return text;
 }
 
 }  // namespace
 
 CLI::App* addInfoCommand(CLI::App& app, InfoOptions& options) {
-  CLI::App* command =
-      app.add_subcommand("info", "Describe the point layer a .rwb or .ply file opens as.");
-  command->add_option("FILE", options.file, "a .rwb point file or a .ply file")->required();
+  CLI::App* command = app.add_subcommand(
+      "info", "Describe the point layer a .rwb, .ply or Bundler .out file opens as.");
+  command->add_option("FILE", options.file, "a .rwb point file, a .ply file or a Bundler .out file")
+      ->required();
   command->add_flag("--json", options.json, "print one JSON object instead of text");
   command->footer(
       "The JSON object has \"file\", \"points\", \"faces\", \"hasNormals\" (28-byte records with "
       "normals), \"bbox\" ([minX, minY, minZ, maxX, maxY, maxZ]) and \"luckHistogram\" (256 "
       "counts of records by luck value); for a PLY file also \"ply\": {\"format\", \"elements\": "
       "[{\"name\", \"count\", \"properties\": [{\"name\", \"type\"}]}]}, where a list property's "
-      "type reads \"list <length type> <value type>\", e.g. \"list uchar int\".\n"
-      "A PLY file is described as imported: every vertex, positions and colours only.");
+      "type reads \"list <length type> <value type>\", e.g. \"list uchar int\"; for a bundle "
+      "file also \"bundle\": {\"cameras\", \"points\"} (the counts its header claims) and "
+      "\"cameras\": [{\"index\", \"focal\", \"k1\", \"k2\", \"centre\" ([x, y, z]), "
+      "\"fieldOfView\" (degrees, from the photograph's width), \"image\": {\"width\", "
+      "\"height\"} or null when the photograph is missing}].\n"
+      "A PLY file is described as imported: every vertex, positions and colours only; a bundle "
+      "file too: its points, and its cameras with the photographs named by the list.txt two "
+      "folders up.");
   return command;
 }
 
@@ -100,6 +143,18 @@ int runInfoCommand(const InfoOptions& options) {
     }
     header = std::move(described);
   }
+  std::optional<BundleHeaderDescription> bundle;
+  if (kind == PointFileKind::Bundler) {
+    // The import takes any text for a bundle file of nothing, so the counts
+    // line is checked first: that is what tells a bundle file.
+    Error error;
+    BundleHeaderDescription counts;
+    if (!checkReadable(path, &error) || !describeBundleHeader(path, &counts, &error)) {
+      reportFailure(error.message);
+      return 1;
+    }
+    bundle = counts;
+  }
 
   Error error;
   const std::shared_ptr<PointLayer> layer = openPointCloud(path, kind, 1, &error);
@@ -109,6 +164,7 @@ int runInfoCommand(const InfoOptions& options) {
   }
   PointCloudSummary summary = summarizePointLayer(*layer);
   summary.ply = std::move(header);
+  summary.bundle = bundle;
 
   const std::string out =
       options.json ? toJson(options.file, summary).dump() + "\n" : toText(options.file, summary);

@@ -9,6 +9,7 @@
 #include <system_error>
 
 #include "cli/standard_error_capture.h"
+#include "import/bundler_file.h"
 #include "import/ply_file.h"
 #include "platform/file_location.h"
 #include "scene/point_layer.h"
@@ -63,6 +64,9 @@ PointFileKind pointFileKind(const std::filesystem::path& path) {
   if (extension == ".ply") {
     return PointFileKind::Ply;
   }
+  if (extension == ".out") {
+    return PointFileKind::Bundler;
+  }
   return PointFileKind::Unknown;
 }
 
@@ -90,7 +94,7 @@ void reportFailure(std::string_view message) {
 std::shared_ptr<PointLayer> openPointCloud(const std::filesystem::path& path, PointFileKind kind,
                                            std::int32_t downsample, Error* error) {
   if (kind == PointFileKind::Unknown) {
-    fail(error, fmt::format("{}: not a point file (expected .rwb or .ply)", path.string()));
+    fail(error, fmt::format("{}: not a point file (expected .rwb, .ply or .out)", path.string()));
     return nullptr;
   }
   if (!checkReadable(path, error)) {
@@ -116,7 +120,15 @@ std::shared_ptr<PointLayer> openPointCloud(const std::filesystem::path& path, Po
     return layer;
   }
 
-  auto layer = std::make_shared<PointLayer>();
+  // A bundle file's layer is made as its import makes it, but loaded here
+  // so that a failure comes back as a value rather than an alert.
+  std::shared_ptr<PointLayer> layer;
+  if (kind == PointFileKind::Bundler) {
+    layer = std::make_shared<BundlerFile>();
+    layer->setOriginalURL(path);
+  } else {
+    layer = std::make_shared<PointLayer>();
+  }
   layer->setName(lastPathComponent(path));
   Error loadError;
   // The result is inverted and a short read still answers success: only

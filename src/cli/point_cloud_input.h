@@ -16,9 +16,9 @@ class PointLayer;
 
 namespace cloudreel::cli {
 
-enum class PointFileKind { Unknown, PointFile, Ply };
+enum class PointFileKind { Unknown, PointFile, Ply, Bundler };
 
-// By extension, in any case: ".rwb" or ".ply".
+// By extension, in any case: ".rwb", ".ply" or ".out" (a bundle file).
 PointFileKind pointFileKind(const std::filesystem::path& path);
 
 // Writes "cloudreel: <message>" as one line on standard error.
@@ -30,8 +30,10 @@ void reportFailure(std::string_view message);
 // folder and an open panel.
 [[nodiscard]] bool checkReadable(const std::filesystem::path& path, Error* error);
 
-// The layer the file opens as: a point layer loaded from a ".rwb" file, or
-// the PLYFile layer of every `downsample`-th vertex of a ".ply" file. Large
+// The layer the file opens as: a point layer loaded from a ".rwb" file, the
+// PLYFile layer of every `downsample`-th vertex of a ".ply" file, or the
+// BundlerFile layer (every point, the cameras in its child field) of a
+// ".out" file. Large
 // files get a stage line on standard error first. Null on failure, with the
 // error's message saying what failed on which file ("cannot read points
 // from x.rwb: Cannot read points: short read"); whatever the core or the

@@ -2,7 +2,11 @@
 
 #include <algorithm>
 
+#include "camera/camera_field.h"
+#include "camera/source_camera.h"
 #include "import/ply/ply.h"
+#include "import/text_scanner.h"
+#include "platform/byte_stream.h"
 #include "scene/point_layer.h"
 
 namespace cloudreel::cli {
@@ -29,10 +33,39 @@ std::string propertyType(p_ply_property property) {
   return std::string("list ") + ply_type_name(lengthType) + " " + ply_type_name(valueType);
 }
 
+CameraDescription describeCamera(const Camera& camera) {
+  CameraDescription described;
+  described.index = camera.number();
+  const AffineTransform::Matrix& placement = camera.objectToWorld()->mx();
+  // Adding +0 turns the negative zeros of −Rᵀt (an axis-aligned camera
+  // has them) into zeros, so they do not print as "-0".
+  described.centre = {placement[12] + 0.0, placement[13] + 0.0, placement[14] + 0.0};
+  described.fieldOfView = camera.fieldOfView();
+  if (const auto* source = dynamic_cast<const SourceCamera*>(&camera)) {
+    described.focal = source->focal();
+    described.k1 = source->k1();
+    described.k2 = source->k2();
+    if (source->hasImage()) {
+      described.image = {source->imageWidth(), source->imageHeight()};
+    }
+  }
+  return described;
+}
+
 }  // namespace
 
 PointCloudSummary summarizePointLayer(const PointLayer& layer) {
   PointCloudSummary summary;
+  if (layer.childLayerCount() > 0) {
+    if (const auto field = std::dynamic_pointer_cast<CameraField>(layer.childLayers()[0])) {
+      summary.cameras.emplace();
+      for (const std::shared_ptr<Camera>& camera : field->cameras()) {
+        if (camera) {
+          summary.cameras->push_back(describeCamera(*camera));
+        }
+      }
+    }
+  }
   summary.faces = layer.nFaces();
   summary.hasNormals = layer.hasNormalsField();
   summary.bbox = layer.bbox();
@@ -76,6 +109,34 @@ bool describePlyHeader(const std::filesystem::path& path, PlyHeaderDescription* 
       described.properties.push_back({propertyName ? propertyName : "", propertyType(property)});
     }
   }
+  return true;
+}
+
+bool describeBundleHeader(const std::filesystem::path& path, BundleHeaderDescription* header,
+                          Error* error) {
+  const auto in = FileInputStream::open(path, error);
+  if (!in) {
+    return false;
+  }
+  // The first line is the format's comment, whatever it says; the counts
+  // follow it.
+  TextScanner scanner(*in);
+  if (!scanner.readLine()) {
+    // In the import's words, as the same file's import would fail.
+    setError(error, "cloudreel", 1,
+             "cannot read points from " + path.string() + ": File corrupt: short read");
+    return false;
+  }
+  std::int64_t cameras = -1;
+  std::int64_t points = -1;
+  if (!scanner.scan(cameras) || !scanner.scan(points) || cameras < 0 || points < 0) {
+    setError(
+        error, "cloudreel", 1,
+        path.string() + ": not a bundle file (no camera and point counts after its first line)");
+    return false;
+  }
+  header->cameras = cameras;
+  header->points = points;
   return true;
 }
 

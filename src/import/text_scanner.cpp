@@ -1,6 +1,8 @@
 #include "import/text_scanner.h"
 
+#include <algorithm>
 #include <charconv>
+#include <cstring>
 #include <limits>
 #include <system_error>
 
@@ -43,16 +45,23 @@ bool TextScanner::fill() {
   return true;
 }
 
-int TextScanner::peek() { return fill() ? static_cast<unsigned char>(buffer_[next_]) : -1; }
-
 std::uint64_t TextScanner::remainingBytes() const { return (end_ - next_) + in_.remaining(); }
+
+// The scans below take the buffered bytes a run at a time and refill only
+// when a run is used up; a refill test on every byte was most of the cost
+// of a large import.
 
 bool TextScanner::readLine() {
   std::size_t taken = 0;
   while (taken < kLineLimit && fill()) {
-    const char c = buffer_[next_++];
-    ++taken;
-    if (c == '\n') {
+    const char* run = buffer_.data() + next_;
+    const std::size_t length = std::min(end_ - next_, kLineLimit - taken);
+    const void* newline = std::memchr(run, '\n', length);
+    const std::size_t used =
+        newline ? static_cast<std::size_t>(static_cast<const char*>(newline) - run) + 1 : length;
+    next_ += used;
+    taken += used;
+    if (newline) {
       break;
     }
   }
@@ -60,22 +69,46 @@ bool TextScanner::readLine() {
 }
 
 bool TextScanner::atEnd() {
-  for (int c = peek(); c >= 0 && isSpace(c); c = peek()) {
-    ++next_;
+  while (fill()) {
+    while (next_ < end_ && isSpace(static_cast<unsigned char>(buffer_[next_]))) {
+      ++next_;
+    }
+    if (next_ < end_) {
+      return false;
+    }
   }
-  return peek() < 0;
+  return true;
 }
 
 bool TextScanner::nextField() {
   if (atEnd()) {
     return false;
   }
+  // A field may run over the end of the buffer; its first 511 characters
+  // are kept, the rest consumed.
   fieldLength_ = 0;
-  for (int c = peek(); c >= 0 && !isSpace(c); c = peek()) {
-    if (fieldLength_ < sizeof(field_) - 1) {
-      field_[fieldLength_++] = static_cast<char>(c);
+  fieldData_ = field_;
+  while (fill()) {
+    const char* run = buffer_.data() + next_;
+    std::size_t length = 0;
+    while (next_ + length < end_ && !isSpace(static_cast<unsigned char>(run[length]))) {
+      ++length;
     }
-    ++next_;
+    if (fieldLength_ == 0 && next_ + length < end_) {
+      // Whole in the buffer: parsed where it lies, which stays valid until
+      // the next fill.
+      fieldData_ = run;
+      fieldLength_ = std::min(length, sizeof(field_) - 1);
+      next_ += length;
+      break;
+    }
+    const std::size_t kept = std::min(length, sizeof(field_) - 1 - fieldLength_);
+    std::memcpy(field_ + fieldLength_, run, kept);
+    fieldLength_ += kept;
+    next_ += length;
+    if (next_ < end_) {
+      break;
+    }
   }
   return true;
 }
@@ -84,8 +117,8 @@ bool TextScanner::scan(std::int64_t& value) {
   if (!nextField()) {
     return false;
   }
-  const char* last = field_ + fieldLength_;
-  const char* first = numberStart(field_, last);
+  const char* last = fieldData_ + fieldLength_;
+  const char* first = numberStart(fieldData_, last);
   std::int64_t parsed = 0;
   const auto [ptr, ec] = std::from_chars(first, last, parsed);
   if (ec == std::errc::result_out_of_range) {
@@ -111,11 +144,11 @@ bool parseFloating(const char* field, std::size_t length, F& value) {
 }  // namespace
 
 bool TextScanner::scan(float& value) {
-  return nextField() && parseFloating(field_, fieldLength_, value);
+  return nextField() && parseFloating(fieldData_, fieldLength_, value);
 }
 
 bool TextScanner::scan(double& value) {
-  return nextField() && parseFloating(field_, fieldLength_, value);
+  return nextField() && parseFloating(fieldData_, fieldLength_, value);
 }
 
 }  // namespace cloudreel

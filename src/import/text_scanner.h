@@ -43,14 +43,16 @@ class TextScanner {
 
  private:
   bool fill();
-  int peek();
-  // The next field, its first 511 characters kept in field_; false at end.
+  // The next field, its first 511 characters in fieldData_; false at end.
   bool nextField();
 
   InputStream& in_;
   std::vector<char> buffer_;
   std::size_t next_ = 0;
   std::size_t end_ = 0;
+  // The field read last: in the buffer where it lies whole there, else
+  // gathered into field_.
+  const char* fieldData_ = nullptr;
   char field_[512] = {};
   std::size_t fieldLength_ = 0;
 };

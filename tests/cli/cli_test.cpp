@@ -5,14 +5,19 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <spawn.h>
+#include <stb/stb_image_write.h>
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <array>
 #include <bit>
+#include <cmath>
 #include <cstdint>
 #include <cstring>
 #include <fstream>
 #include <nlohmann/json.hpp>
+#include <numbers>
+#include <numeric>
 #include <set>
 #include <sstream>
 #include <string>
@@ -177,6 +182,85 @@ TEST(CliInfo, DescribesPointFilesWithEitherRecordLayout) {
   EXPECT_EQ(normals["luckHistogram"][2], 2);
 }
 
+TEST(CliInfo, DescribesABundleFileWithItsCamerasAndTheirPhotographs) {
+  TempDir dir;
+  const fs::path root = dir / "scene";
+  fs::create_directories(root / "bundle");
+  fs::create_directories(root / "images");
+  // Two photographs of different sizes; the third camera's is missing.
+  const std::vector<std::uint8_t> grey(100 * 50, 128);
+  ASSERT_NE(stbi_write_jpg((root / "images/a.jpg").c_str(), 64, 48, 1, grey.data(), 90), 0);
+  ASSERT_NE(stbi_write_jpg((root / "images/b.jpg").c_str(), 100, 50, 1, grey.data(), 90), 0);
+  writeFile(root / "list.txt", "images/a.jpg 0 500\nimages/b.jpg 0 800\nimages/gone.jpg 0 700\n");
+
+  struct BundleCamera {
+    double focal, k1, k2;
+    std::array<std::array<double, 3>, 3> r;  // world to camera, by rows
+    std::array<double, 3> t;
+    int width;  // of the photograph; 0 without one
+    int height;
+  };
+  const BundleCamera cameras[] = {
+      {500, -0.01, 0.002, {{{1, 0, 0}, {0, 1, 0}, {0, 0, 1}}}, {0, 0, -5}, 64, 48},
+      {800, 0, 0, {{{0.8, 0, -0.6}, {0, 1, 0}, {0.6, 0, 0.8}}}, {1, -2, 3}, 100, 50},
+      {700, 0.1, 0, {{{0, -1, 0}, {1, 0, 0}, {0, 0, 1}}}, {0.5, 0.25, -4}, 0, 0},
+  };
+  std::ostringstream bundle;
+  bundle << "# Bundle file v0.3\n3 20\n";
+  for (const BundleCamera& c : cameras) {
+    bundle << c.focal << ' ' << c.k1 << ' ' << c.k2 << '\n';
+    for (const auto& row : c.r) {
+      bundle << row[0] << ' ' << row[1] << ' ' << row[2] << '\n';
+    }
+    bundle << c.t[0] << ' ' << c.t[1] << ' ' << c.t[2] << '\n';
+  }
+  // Point i at (i/2 - 3, i % 5 - 2, -(i % 3) / 4), seen by two cameras.
+  for (int i = 0; i < 20; ++i) {
+    bundle << i * 0.5 - 3 << ' ' << i % 5 - 2 << ' ' << -(i % 3) * 0.25 << '\n'
+           << i * 10 << ' ' << 255 - i << " 7\n2 0 " << i << " 1.5 -2.25 2 " << i << " 0.5 0.75\n";
+  }
+  writeFile(root / "bundle/bundle.out", bundle.str());
+
+  const nlohmann::json info = infoJson(dir, "scene/bundle/bundle.out");
+  EXPECT_EQ(info["points"], 20);
+  EXPECT_EQ(info["faces"], 0);
+  EXPECT_EQ(info["hasNormals"], false);
+  EXPECT_EQ(info["bbox"], nlohmann::json({-3.0, -2.0, -0.5, 6.5, 2.0, 0.0}));
+  const auto histogram = info["luckHistogram"].get<std::vector<int>>();
+  ASSERT_EQ(histogram.size(), 256u);
+  EXPECT_EQ(std::accumulate(histogram.begin(), histogram.end(), 0), 20);
+  EXPECT_EQ(info["bundle"], nlohmann::json({{"cameras", 3}, {"points", 20}}));
+  ASSERT_EQ(info["cameras"].size(), 3u);
+  for (int i = 0; i < 3; ++i) {
+    SCOPED_TRACE(i);
+    const BundleCamera& c = cameras[i];
+    const nlohmann::json& camera = info["cameras"][std::size_t(i)];
+    EXPECT_EQ(camera["index"], i);
+    EXPECT_EQ(camera["focal"], c.focal);
+    EXPECT_EQ(camera["k1"], c.k1);
+    EXPECT_EQ(camera["k2"], c.k2);
+    // The centre is -Rᵀt.
+    const auto centre = camera["centre"].get<std::vector<double>>();
+    ASSERT_EQ(centre.size(), 3u);
+    for (std::size_t axis = 0; axis < 3; ++axis) {
+      const double expected =
+          -(c.r[0][axis] * c.t[0] + c.r[1][axis] * c.t[1] + c.r[2][axis] * c.t[2]);
+      EXPECT_NEAR(centre[axis], expected, 1e-12) << axis;
+    }
+    const double fov = 2 * std::atan((c.width - 1) / (2 * c.focal)) * 180 / std::numbers::pi;
+    EXPECT_NEAR(camera["fieldOfView"].get<double>(), fov, 1e-4);
+    EXPECT_EQ(camera["image"], c.width == 0
+                                   ? nlohmann::json(nullptr)
+                                   : nlohmann::json({{"width", c.width}, {"height", c.height}}));
+  }
+
+  const Outcome text = cloudreel(dir, {"info", "scene/bundle/bundle.out"});
+  EXPECT_EQ(text.status, 0);
+  EXPECT_NE(text.out.find("bundle.out: 20 points"), std::string::npos) << text.out;
+  EXPECT_NE(text.out.find("photograph 100x50\n"), std::string::npos) << text.out;
+  EXPECT_NE(text.out.find("no photograph\n"), std::string::npos) << text.out;
+}
+
 TEST(CliConvert, WritesAPointFileThatOpensAsTheSameCloud) {
   TempDir dir;
   writeFile(dir / "scan.PLY", plyCloud(300, "binary_little_endian"));
@@ -202,6 +286,8 @@ TEST(CliCommands, RefuseBadInputWithOneLineNamingTheFileAndLeaveNoOutput) {
   writeFile(dir / "bad-value.ply", badValue);
   const std::string points = pointFile({1, 2, 3, 4}, false, 0);
   writeFile(dir / "truncated.rwb", points.substr(0, points.size() - 20));
+  writeFile(dir / "empty.out", "");
+  writeFile(dir / "garbage.out", "this is not a reconstruction\n");
   const std::set<fs::path> inputs(fs::directory_iterator(dir.path()), fs::directory_iterator());
 
   const struct {
@@ -214,6 +300,9 @@ TEST(CliCommands, RefuseBadInputWithOneLineNamingTheFileAndLeaveNoOutput) {
       {{"info", "bad-value.ply"}, "bad-value.ply"},
       {{"info", "truncated.rwb", "--json"}, "truncated.rwb: Cannot read points: short read"},
       {{"info", "notes.txt"}, "notes.txt"},
+      {{"info", "missing.out"}, "missing.out"},
+      {{"info", "empty.out", "--json"}, "empty.out: File corrupt: short read"},
+      {{"info", "garbage.out"}, "garbage.out: not a bundle file"},
       {{"convert", "garbage.ply", "out.rwb"}, "garbage.ply"},
       {{"convert", "bad-value.ply", "out.rwb"}, "bad-value.ply"},
       {{"convert", "missing.ply", "out.rwb"}, "missing.ply"},
