@@ -26,6 +26,7 @@
 #include <string_view>
 
 #include "import/bundler_file.h"
+#include "peak_memory.h"
 #include "platform/application_defaults.h"
 #include "platform/log.h"
 #include "platform/user_defaults.h"
@@ -153,19 +154,6 @@ BenchFile& benchFile() {
   return file;
 }
 
-// A figure of /proc/self/status in bytes ("VmRSS", "VmHWM"); 0 when it
-// cannot be read.
-double statusBytes(const std::string& key) {
-  std::ifstream status("/proc/self/status");
-  std::string line;
-  while (std::getline(status, line)) {
-    if (line.starts_with(key + ":")) {
-      return std::strtod(line.c_str() + key.size() + 1, nullptr) * 1024.0;
-    }
-  }
-  return 0.0;
-}
-
 // One import, checked, with its peak memory: the resident high-water mark
 // is reset to the current resident size first, and the figure is what the
 // import adds to the resident size at its peak over the bytes of the array
@@ -173,16 +161,13 @@ double statusBytes(const std::string& key) {
 // reason in `failure`, when the layer is not the file's.
 std::shared_ptr<BundlerFile> importChecked(const std::filesystem::path& path, double& peakOverArray,
                                            const char*& failure) {
-  const double baseline = statusBytes("VmRSS");
-  std::ofstream clearRefs("/proc/self/clear_refs");
-  const bool resettable = static_cast<bool>(clearRefs << "5" << std::flush);
+  const bench::PeakMemory peak;
   auto layer = BundlerFile::initWithURLShouldLink(path, false);
   if (!layer || layer->nPoints() != kPoints || layer->ncameras() != kCameras) {
     failure = "the import failed";
     return nullptr;
   }
-  const double arrayBytes = static_cast<double>(layer->pointArray()->size());
-  peakOverArray = resettable ? (statusBytes("VmHWM") - baseline) / arrayBytes : 0.0;
+  peakOverArray = peak.over(static_cast<double>(layer->pointArray()->size()));
   const color_point& last = layer->colorPoints().back();
   if (last.z != positionOf(kPoints - 1).z || last.r != (kPoints - 1) % 256) {
     failure = "the last point was read wrongly";

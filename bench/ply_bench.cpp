@@ -24,6 +24,7 @@
 
 #include "import/ply/ply.h"
 #include "import/ply_file.h"
+#include "peak_memory.h"
 
 namespace cloudreel {
 namespace {
@@ -201,19 +202,6 @@ BENCHMARK(BM_ReadBinaryLittleEndian)->Iterations(5)->UseRealTime()->Unit(benchma
 void BM_ReadAscii(benchmark::State& state) { readVertices(state, benchFiles().ascii); }
 BENCHMARK(BM_ReadAscii)->Iterations(3)->UseRealTime()->Unit(benchmark::kMillisecond);
 
-// A figure of /proc/self/status in bytes ("VmRSS", "VmHWM"); 0 when it
-// cannot be read.
-double statusBytes(const std::string& key) {
-  std::ifstream status("/proc/self/status");
-  std::string line;
-  while (std::getline(status, line)) {
-    if (line.starts_with(key + ":")) {
-      return std::strtod(line.c_str() + key.size() + 1, nullptr) * 1024.0;
-    }
-  }
-  return 0.0;
-}
-
 // One import, checked, with its peak memory: the resident high-water mark
 // is reset to the current resident size first, and the figure is what the
 // import adds to the resident size at its peak over the bytes of the array
@@ -221,16 +209,13 @@ double statusBytes(const std::string& key) {
 // reason in `failure`, when the layer is not the file's.
 std::shared_ptr<PLYFile> importChecked(const std::filesystem::path& path, double& peakOverArray,
                                        const char*& failure) {
-  const double baseline = statusBytes("VmRSS");
-  std::ofstream clearRefs("/proc/self/clear_refs");
-  const bool resettable = static_cast<bool>(clearRefs << "5" << std::flush);
+  const bench::PeakMemory peak;
   auto layer = PLYFile::initWithURLDownsample(path, 1);
   if (!layer || layer->nPoints() != kVertices) {
     failure = "the import failed";
     return nullptr;
   }
-  const double arrayBytes = static_cast<double>(layer->pointArray()->size());
-  peakOverArray = resettable ? (statusBytes("VmHWM") - baseline) / arrayBytes : 0.0;
+  peakOverArray = peak.over(static_cast<double>(layer->pointArray()->size()));
   const Record expected = vertex(kVertices - 1);
   if (std::memcmp(&layer->colorPoints().back(), &expected, 15) != 0) {
     failure = "the last vertex was read wrongly";
