@@ -12,6 +12,7 @@
 #include "camera/camera.h"
 #include "camera/camera_field.h"
 #include "camera/discrete_camera_path.h"
+#include "camera/scene_camera.h"
 #include "camera/slerp_camera_path.h"
 #include "camera/zxy_camera_path.h"
 #include "geometry/rotations.h"
@@ -182,40 +183,40 @@ TEST(CameraPath, TimeAndDurationFollowFramesAndRate) {
   EXPECT_EQ(path.description(), "SLERPCameraPath:SLERP Path");
 }
 
-TEST(CameraPath, EveryKindComesBackFromTheArchive) {
+TEST(CameraPath, EveryKindComesBackFromTheArchiveHandingOutTheSameCameras) {
   const MemoryDefaults defaults;
-  const auto discrete = DiscreteCameraPath::initWithText(kTwoMatrices);
-  discrete->setFps(0);  // reads back as the default
-  discrete->setTranslateGain(0.5f);
-  const auto decoded = testing::roundTrip(discrete);
-  ASSERT_NE(decoded, nullptr);
-  EXPECT_EQ(decoded->nFrames(), 2);
-  EXPECT_EQ(decoded->fps(), 25);
-  EXPECT_EQ(decoded->translateGain(), 0.5f);
-  EXPECT_EQ(std::memcmp(decoded->points().data(), discrete->points().data(), 2 * 184), 0);
-
-  const auto zxy = testing::roundTrip(ZXYCameraPath::initWithText("1\n1 2 3 10 20 30"));
-  ASSERT_NE(zxy, nullptr);
-  EXPECT_EQ(zxy->points()[0].position, (std::array<double, 3>{1, 2, 3}));
-
   auto slerp = std::make_shared<SLERPCameraPath>();
   slerp->setToRotate(Vector3::vectorWithXYZ(10, 20, 30));
   slerp->setFrTranslate(Vector3::vectorWithXYZ(-1, 0, 4));
-  const auto slerpBack = testing::roundTrip(slerp);
-  ASSERT_NE(slerpBack, nullptr);
-  EXPECT_EQ(slerpBack->name(), "SLERP Path");
-  expectPose(slerpBack->cameraInObjectSpaceForTime(0.3f),
-             slerp->cameraInObjectSpaceForTime(0.3f)->inertialToObject()->mx(), {-0.7, 0, 2.8},
-             1e-6);
-
   auto field = std::make_shared<CameraField>();
   field->addCamera(Camera::initWithZDistance(3));
+  field->addCamera(SceneCamera::initWithZDistance(-2));
   field->setFrustumLength(9);  // display settings are not archived
-  const auto fieldBack = testing::roundTrip(field);
-  ASSERT_NE(fieldBack, nullptr);
-  EXPECT_EQ(fieldBack->nFrames(), 1);
-  EXPECT_EQ(fieldBack->frustumLength(), 2.0f);
-  expectPose(fieldBack->cameraInObjectSpaceForFrame(0), AffineTransform::kIdentity, {0, 0, 3});
+  const std::shared_ptr<CameraPath> paths[] = {
+      DiscreteCameraPath::initWithText(kTwoMatrices),
+      ZXYCameraPath::initWithText("2\n1 2 3 10 20 30\n-1 0 5 0 90 0"), slerp, field};
+  for (const auto& path : paths) {
+    SCOPED_TRACE(path->className());
+    path->setName("Path");
+    path->setFps(0);  // reads back as the default
+    path->setTranslateGain(0.5f);
+    const auto back = testing::roundTrip(path);
+    ASSERT_NE(back, nullptr);
+    EXPECT_EQ(back->className(), path->className());
+    EXPECT_EQ(back->name(), "Path");
+    EXPECT_EQ(back->nFrames(), path->nFrames());
+    EXPECT_EQ(back->fps(), 25);
+    EXPECT_EQ(back->translateGain(), 0.5f);
+    for (const float t : {0.0f, 0.3f, 0.6f}) {
+      const auto camera = path->cameraInObjectSpaceForTime(t);
+      ASSERT_NE(camera, nullptr);
+      std::array<double, 3> at{};
+      camera->objectToWorld()->getTranslation(at);
+      expectPose(back->cameraInObjectSpaceForTime(t), camera->inertialToObject()->mx(), at, 1e-6);
+    }
+  }
+  EXPECT_EQ(std::dynamic_pointer_cast<CameraField>(testing::roundTrip(field))->frustumLength(),
+            2.0f);
 }
 
 TEST(DiscreteCameraPath, AShortRecordBlobIsCutToTheRecordsItHolds) {

@@ -13,13 +13,10 @@
 
 #include "camera/scene_camera.h"
 #include "platform/application_defaults.h"
-#include "platform/class_registry.h"
-#include "platform/keyed_archiver.h"
-#include "platform/keyed_unarchiver.h"
 #include "platform/notification_center.h"
 #include "render/opengl_scene.h"
 #include "render/render_options.h"
-#include "scene/core_classes.h"
+#include "scene/archive_helpers.h"
 #include "support/pixel_harness.h"
 
 namespace cloudreel {
@@ -38,16 +35,7 @@ void expectNear(const Point& actual, const Point& expected, const std::string& w
   }
 }
 
-template <class T>
-std::shared_ptr<T> roundTrip(const std::shared_ptr<T>& object) {
-  ClassRegistry registry;
-  registerCoreClasses(registry);
-  Error error;
-  auto decoded = std::dynamic_pointer_cast<T>(KeyedUnarchiver::unarchiveObjectWithData(
-      KeyedArchiver::archivedDataWithRootObject(object), &error, registry));
-  EXPECT_NE(decoded, nullptr) << error.message;
-  return decoded;
-}
+using testing::roundTrip;
 
 // What a camera sees through and from where, in one comparable line.
 std::string lens(const Camera& c) {
@@ -99,14 +87,6 @@ TEST(Camera, NewCopiedAndDecodedCamerasGetTheirLensAsTheyShould) {
     ASSERT_NE(c.camera, nullptr);
     EXPECT_EQ(lens(*c.camera), c.seen);
   }
-}
-
-TEST(Camera, TransformationTurnsBeforeItPlaces) {
-  Camera camera;
-  camera.inertialToObject()->setEulerRotationType({0, 0, 90}, 11);  // x turns to -z
-  camera.objectToWorld()->setTranslation({0, 0, 10});
-  expectNear(applied(*camera.transformation(), {1, 0, 0}), {0, 0, 9}, "x axis");
-  expectNear(applied(*camera.transformation(), {0, 0, 1}), {1, 0, 10}, "z axis");
 }
 
 TEST(Camera, SelectingPostsActivateAndDeactivateFromTheCamera) {

@@ -8,11 +8,8 @@
 #include <limits>
 #include <string>
 
-#include "platform/class_registry.h"
-#include "platform/keyed_archiver.h"
-#include "platform/keyed_unarchiver.h"
 #include "render/opengl_scene.h"
-#include "scene/core_classes.h"
+#include "scene/archive_helpers.h"
 #include "support/pixel_harness.h"
 
 namespace cloudreel {
@@ -84,13 +81,8 @@ TEST(RWTrackball, ArchiveKeepsTheRotationUnderRotateKeysButNotTheDragInProgress)
   trackball->addRotationToTrackball();
   drag(*trackball, {200, 50}, {150, 100});
   const Bytes data = KeyedArchiver::archivedDataWithRootObject(trackball);
-
-  ClassRegistry registry;
-  registerCoreClasses(registry);
-  Error error;
-  const auto decoded = std::dynamic_pointer_cast<RWTrackball>(
-      KeyedUnarchiver::unarchiveObjectWithData(data, &error, registry));
-  ASSERT_NE(decoded, nullptr) << error.message;
+  const auto decoded = testing::decodeAs<RWTrackball>(data);
+  ASSERT_NE(decoded, nullptr);
   EXPECT_EQ(decoded->name(), "Orbit");
   EXPECT_EQ(decoded->rotation(), trackball->rotation());
   EXPECT_EQ(decoded->intermediate(), (AxisAngle{0, 0, 0, 0}));
@@ -106,6 +98,7 @@ TEST(RWTrackball, ArchiveKeepsTheRotationUnderRotateKeysButNotTheDragInProgress)
   };
   ClassRegistry probe;
   probe.registerClass<Keys>("RWTrackball");
+  Error error;
   const auto keys = std::dynamic_pointer_cast<Keys>(
       KeyedUnarchiver::unarchiveObjectWithData(data, &error, probe));
   ASSERT_NE(keys, nullptr) << error.message;

@@ -10,7 +10,6 @@
 
 #include <algorithm>
 #include <array>
-#include <bit>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -23,12 +22,15 @@
 #include <string>
 #include <vector>
 
+#include "support/ply_text.h"
 #include "support/temp_dir.h"
 
 extern char** environ;
 
 namespace {
 
+using cloudreel::testing::PlyElement;
+using cloudreel::testing::plyText;
 using cloudreel::testing::TempDir;
 namespace fs = std::filesystem;
 
@@ -82,34 +84,23 @@ nlohmann::json infoJson(const TempDir& dir, const std::string& file) {
   return nlohmann::json::parse(run.out, nullptr, false);
 }
 
-// A cloud of n vertices, vertex i at (i, -i/2, i % 7), and two faces, in
-// the given PLY format.
+// A cloud of n vertices, vertex i at (i, -i/2, i % 7) coloured (i, 2i, 3i)
+// modulo 256, and two faces, in the given PLY format.
 std::string plyCloud(int n, const std::string& format) {
-  std::ostringstream out;
-  out << "ply\nformat " << format << " 1.0\nelement vertex " << n
-      << "\nproperty float x\nproperty float y\nproperty float z\n"
-         "property uchar red\nproperty uchar green\nproperty uchar blue\n"
-         "element face 2\nproperty list uchar int vertex_indices\nend_header\n";
-  auto put = [&](auto value) {
-    if (format == "ascii") {
-      out << +value << ' ';
-      return;
-    }
-    char bytes[sizeof value];
-    std::memcpy(bytes, &value, sizeof value);
-    if ((format == "binary_big_endian") != (std::endian::native == std::endian::big)) {
-      std::reverse(bytes, bytes + sizeof value);
-    }
-    out.write(bytes, sizeof value);
-  };
+  PlyElement vertex{"vertex",
+                    {{"float", "x"},
+                     {"float", "y"},
+                     {"float", "z"},
+                     {"uchar", "red"},
+                     {"uchar", "green"},
+                     {"uchar", "blue"}},
+                    {}};
   for (int i = 0; i < n; ++i) {
-    put(float(i)), put(float(-0.5 * i)), put(float(i % 7));
-    put(std::uint8_t(i)), put(std::uint8_t(2 * i)), put(std::uint8_t(3 * i));
+    vertex.instances.push_back({double(i), -0.5 * i, double(i % 7), double(i % 256),
+                                double(2 * i % 256), double(3 * i % 256)});
   }
-  for (int face = 0; face < 2; ++face) {
-    put(std::uint8_t(3)), put(face), put(face + 1), put(face + 2);
-  }
-  return out.str();
+  const PlyElement face{"face", {{"int", "vertex_indices", "uchar"}}, {{3, 0, 1, 2}, {3, 1, 2, 3}}};
+  return plyText({vertex, face}, format);
 }
 
 // A point file: 88-byte header and box, records of 16 bytes (28 with
@@ -282,45 +273,40 @@ TEST(CliCommands, RefuseBadInputWithOneLineNamingTheFileAndLeaveNoOutput) {
   writeFile(dir / "cloud.ply", plyCloud(10, "ascii"));
   writeFile(dir / "garbage.ply", "this is not a point cloud\n");
   std::string badValue = plyCloud(10, "ascii");
-  badValue.replace(badValue.find(" 4 -2 4 "), 8, " 4 -2 x ");
+  badValue.replace(badValue.find("\n4 -2 4 "), 8, "\n4 -2 x ");
   writeFile(dir / "bad-value.ply", badValue);
   const std::string points = pointFile({1, 2, 3, 4}, false, 0);
   writeFile(dir / "truncated.rwb", points.substr(0, points.size() - 20));
   writeFile(dir / "empty.out", "");
   writeFile(dir / "garbage.out", "this is not a reconstruction\n");
-  const std::set<fs::path> inputs(fs::directory_iterator(dir.path()), fs::directory_iterator());
+  const std::set<fs::path> before(fs::directory_iterator(dir.path()), fs::directory_iterator());
 
-  const struct {
-    std::vector<std::string> args;
-    std::string named;
-  } cases[] = {
-      {{"info", "missing.ply"}, "missing.ply"},
-      {{"info", "missing.rwb"}, "missing.rwb"},
-      {{"info", "garbage.ply"}, "garbage.ply"},
-      {{"info", "bad-value.ply"}, "bad-value.ply"},
-      {{"info", "truncated.rwb", "--json"}, "truncated.rwb: Cannot read points: short read"},
-      {{"info", "notes.txt"}, "notes.txt"},
-      {{"info", "missing.out"}, "missing.out"},
-      {{"info", "empty.out", "--json"}, "empty.out: File corrupt: short read"},
-      {{"info", "garbage.out"}, "garbage.out: not a bundle file"},
-      {{"convert", "garbage.ply", "out.rwb"}, "garbage.ply"},
-      {{"convert", "bad-value.ply", "out.rwb"}, "bad-value.ply"},
-      {{"convert", "missing.ply", "out.rwb"}, "missing.ply"},
+  // Every bad input goes to info (plain and --json), which says why after
+  // the file's name, and to convert, which reads only .ply files and names
+  // the input either way.
+  std::vector<std::pair<std::vector<std::string>, std::string>> runs = {
       {{"convert", "cloud.ply", "out.txt"}, "out.txt"},
-      {{"convert", "truncated.rwb", "out.rwb"}, "truncated.rwb"},
-      {{"convert", "cloud.ply", "no-folder/out.rwb"}, "no-folder/out.rwb"},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.args[0] + " " + c.args[1]);
-    const Outcome run = cloudreel(dir, c.args);
+      {{"convert", "cloud.ply", "no-folder/out.rwb"}, "no-folder/out.rwb"}};
+  for (const std::string named :
+       {"missing.ply", "missing.rwb", "missing.out", "notes.txt", "garbage.ply", "bad-value.ply",
+        "truncated.rwb: Cannot read points: short read", "empty.out: File corrupt: short read",
+        "garbage.out: not a bundle file"}) {
+    const std::string file = named.substr(0, named.find(':'));
+    runs.push_back({{"info", file}, named});
+    runs.push_back({{"info", file, "--json"}, named});
+    runs.push_back({{"convert", file, "out.rwb"}, file});
+  }
+  for (const auto& [args, named] : runs) {
+    SCOPED_TRACE(args[0] + " " + args[1] + (args.size() > 2 ? " " + args[2] : ""));
+    const Outcome run = cloudreel(dir, args);
     EXPECT_NE(run.status, 0);
     EXPECT_EQ(run.out, "");
     EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
     EXPECT_EQ(run.err.rfind("cloudreel: ", 0), 0u) << run.err;
-    EXPECT_NE(run.err.find(c.named), std::string::npos) << run.err;
+    EXPECT_NE(run.err.find(named), std::string::npos) << run.err;
   }
   const std::set<fs::path> after(fs::directory_iterator(dir.path()), fs::directory_iterator());
-  EXPECT_EQ(after, inputs);
+  EXPECT_EQ(after, before);
 }
 
 }  // namespace

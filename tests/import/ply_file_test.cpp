@@ -3,9 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <charconv>
 #include <cmath>
-#include <cstring>
 #include <fstream>
 #include <limits>
 #include <string>
@@ -13,6 +11,7 @@
 #include <vector>
 
 #include "scene/archive_helpers.h"
+#include "support/ply_text.h"
 #include "support/temp_dir.h"
 
 namespace cloudreel {
@@ -26,31 +25,14 @@ struct Element {
 
 std::filesystem::path writePly(const std::filesystem::path& path, const std::string& format,
                                const std::vector<Element>& elements) {
-  std::string out = "ply\nformat " + format + " 1.0\n";
+  std::vector<testing::PlyElement> ply;
   for (const Element& e : elements) {
-    out += "element " + e.name + " " + std::to_string(e.rows.size()) + "\n";
-    for (const std::string& p : e.properties) out += "property " + p + "\n";
-  }
-  out += "end_header\n";
-  for (const Element& e : elements) {
-    for (const auto& row : e.rows) {
-      for (std::size_t i = 0; i < row.size(); ++i) {
-        char b[32];
-        auto put = [&](auto v) {
-          std::memcpy(b, &v, sizeof v);
-          if (format == "binary_big_endian") std::reverse(b, b + sizeof v);
-          out.append(b, sizeof v);
-        };
-        const char type = e.properties[i][0];
-        if (format == "ascii") {
-          out.append(b, std::to_chars(b, b + 32, row[i]).ptr) += i + 1 < row.size() ? " " : "\n";
-        } else {
-          type == 'f' ? put(float(row[i])) : type == 'd' ? put(row[i]) : put(std::uint8_t(row[i]));
-        }
-      }
+    ply.push_back({e.name, {}, e.rows});
+    for (const std::string& p : e.properties) {
+      ply.back().properties.push_back({p.substr(0, p.find(' ')), p.substr(p.find(' ') + 1)});
     }
   }
-  std::ofstream(path, std::ios::binary) << out;
+  std::ofstream(path, std::ios::binary) << testing::plyText(ply, format);
   return path;
 }
 

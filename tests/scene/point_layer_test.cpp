@@ -14,7 +14,6 @@
 #include "platform/user_defaults.h"
 #include "scene/archive_helpers.h"
 #include "scene/core_classes.h"
-#include "scene/my_document.h"
 #include "support/scripted_user_interaction.h"
 #include "support/temp_dir.h"
 
@@ -140,27 +139,6 @@ TEST_F(PointLayerTest, BadFilesAreRefusedWithTheirMessageAndNothingHostileIsAllo
       EXPECT_EQ(layer->nPoints(), c.pointsAfter) << c.what;
     }
   }
-}
-
-TEST_F(PointLayerTest, TheNormalsFlagSelects28ByteRecords) {
-  Bytes file(88 + 2 * 28, 0);
-  std::memcpy(file.data(), "RWBP", 4);
-  file[12] = 2;
-  file[24] = 1;
-  for (int i = 0; i < 2; ++i) {
-    const color_point_with_normal p{1.0f + i, 2, 3, 0, 0, 1, 10, 20, 30, std::uint8_t(i)};
-    std::memcpy(file.data() + 88 + 28 * i, &p, 28);
-  }
-  writeAll(dir / "normals.rwb", file);
-  PointLayer layer;
-  Error error;
-  layer.loadPointsFromURLError(dir / "normals.rwb", &error);
-  EXPECT_EQ(error.message, "");
-  EXPECT_TRUE(layer.hasNormalsField());
-  EXPECT_FALSE(layer.hasNormals());
-  ASSERT_EQ(layer.nPoints(), 2);
-  EXPECT_EQ(layer.pointArray()->size(), 56u);
-  EXPECT_EQ(std::memcmp(layer.points(), file.data() + 88, 56), 0);
 }
 
 TEST_F(PointLayerTest, ALargeArrayIsZeroedToItsLastRecord) {
@@ -334,18 +312,6 @@ TEST_F(PointLayerTest, SavingBackNeedsALinkAndClearsTheModifiedMark) {
   linked->saveLinkedLayer();
   EXPECT_FALSE(linked->isModified());
   EXPECT_EQ(readAll(path)[88 + 16 + 12], 99);
-}
-
-TEST_F(PointLayerTest, PointSizeChangesUndoByName) {
-  MyDocument document;
-  const auto layer = layerOf(1);
-  document.addLayer(layer);
-  document.undoManager().closeEventGroup();
-  layer->setPointSize(4.0f);
-  document.undoManager().closeEventGroup();
-  EXPECT_EQ(document.undoManager().undoActionName(), "Change Point Size");
-  document.undoManager().undo();
-  EXPECT_EQ(layer->pointSize(), 1.0f);  // the registered default
 }
 
 }  // namespace

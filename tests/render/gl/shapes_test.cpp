@@ -21,15 +21,6 @@ using ShapesTest = testing::PixelTest;
 
 void red() { glColor3ub(255, 0, 0); }
 
-TEST_F(ShapesTest, ACubeSeenAlongAnAxisIsASquareOfItsEdge) {
-  const Frame frame = render(64, 64, [] {
-    red();
-    drawSolidCube(30);
-  });
-  EXPECT_EQ(frame.count(kRed), 30 * 30);
-  EXPECT_EQ(frame.drawnBounds(), (Box{17, 17, 47, 47}));
-}
-
 TEST_F(ShapesTest, AConeSeenFromTheSideIsATriangleWithItsApexAtTheHeight) {
   const double radius = 20;
   const double height = 40;
