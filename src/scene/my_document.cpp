@@ -1,8 +1,12 @@
 #include "scene/my_document.h"
 
 #include <algorithm>
+#include <typeinfo>
 
+#include "camera/camera_path.h"
+#include "camera/discrete_camera_path.h"
 #include "camera/scene_camera.h"
+#include "camera/transform_stack.h"
 #include "platform/log.h"
 #include "platform/run_loop.h"
 #include "scene/layer.h"
@@ -10,11 +14,35 @@
 
 namespace cloudreel {
 
+namespace {
+
+// Depth first, parent before children. `ancestors` holds the layers above
+// `layer` on the way down; meeting one of them again means the tree loops
+// back on itself there, and that branch is not entered a second time.
+void gatherCameraPaths(const std::shared_ptr<Layer>& layer,
+                       std::vector<std::shared_ptr<CameraPath>>& paths,
+                       std::vector<const Layer*>& ancestors) {
+  if (!layer || std::find(ancestors.begin(), ancestors.end(), layer.get()) != ancestors.end()) {
+    return;
+  }
+  if (auto path = std::dynamic_pointer_cast<CameraPath>(layer)) {
+    paths.push_back(std::move(path));
+  }
+  ancestors.push_back(layer.get());
+  for (const auto& child : layer->childLayers()) {
+    gatherCameraPaths(child, paths, ancestors);
+  }
+  ancestors.pop_back();
+}
+
+}  // namespace
+
 MyDocument::MyDocument()
     : sceneCamera_(SceneCamera::initWithZDistance(15.0)),
       lightSource_(std::make_shared<LightSource>()),
       undoManager_(&RunLoop::main()) {
   sceneCamera_->setName("Scene Camera");
+  transformStacks_.push_back(std::make_shared<TransformStack>());
   NotificationCenter::defaultCenter().addObserver(
       *this, std::string(kGridColorChangedNotification), nullptr,
       [this](const Notification& n) { handleGridColorChange(n); });
@@ -129,6 +157,80 @@ void MyDocument::addLayer(std::shared_ptr<Layer> layer) {
   insertObjectInLayersAtIndex(layer, static_cast<int>(layers_.size()));
   didChangeValueForKey("layers");
   setSelectedLayer(layer);
+}
+
+// --- camera paths and transform stacks
+
+void MyDocument::setCameraPaths(std::vector<std::shared_ptr<CameraPath>> paths) {
+  changeValueForKey("cameraPaths", cameraPaths_, std::move(paths));
+}
+
+void MyDocument::insertObjectInCameraPathsAtIndex(std::shared_ptr<CameraPath> path, int index) {
+  if (!path || index < 0 || static_cast<std::size_t>(index) > cameraPaths_.size()) {
+    logf("insertObject:inCameraPathsAtIndex: index %d is outside 0...%d; nothing inserted", index,
+         static_cast<int>(cameraPaths_.size()));
+    return;
+  }
+  undoManager_.registerUndoWithTarget(this,
+                                      [this, index] { removeObjectFromCameraPathsAtIndex(index); });
+  if (!undoManager_.isUndoing()) {
+    undoManager_.setActionName("New Camera Path");
+  }
+  cameraPaths_.insert(cameraPaths_.begin() + index, std::move(path));
+  hasChanged();
+}
+
+void MyDocument::removeObjectFromCameraPathsAtIndex(int index) {
+  if (index < 0 || static_cast<std::size_t>(index) >= cameraPaths_.size()) {
+    logf(
+        "removeObjectFromCameraPathsAtIndex: index %d is outside the %d camera paths; nothing "
+        "removed",
+        index, static_cast<int>(cameraPaths_.size()));
+    return;
+  }
+  const std::shared_ptr<CameraPath> path = cameraPaths_[static_cast<std::size_t>(index)];
+  undoManager_.registerUndoWithTarget(
+      this, [this, path, index] { insertObjectInCameraPathsAtIndex(path, index); });
+  if (!undoManager_.isUndoing()) {
+    undoManager_.setActionName("Remove Camera Path");
+  }
+  cameraPaths_.erase(cameraPaths_.begin() + index);
+  hasChanged();
+}
+
+void MyDocument::addCameraPath(std::shared_ptr<CameraPath> path) {
+  willChangeValueForKey("cameraPaths");
+  insertObjectInCameraPathsAtIndex(std::move(path), static_cast<int>(cameraPaths_.size()));
+  didChangeValueForKey("cameraPaths");
+}
+
+void MyDocument::addCameraPathsForLayer(const std::shared_ptr<Layer>& layer,
+                                        std::vector<std::shared_ptr<CameraPath>>& paths) {
+  std::vector<const Layer*> ancestors;
+  gatherCameraPaths(layer, paths, ancestors);
+}
+
+std::vector<std::shared_ptr<CameraPath>> MyDocument::cameraPaths() const {
+  std::vector<std::shared_ptr<CameraPath>> paths;
+  for (const auto& layer : layers_) {
+    addCameraPathsForLayer(layer, paths);
+  }
+  return paths;
+}
+
+std::vector<std::shared_ptr<DiscreteCameraPath>> MyDocument::discretePaths() const {
+  std::vector<std::shared_ptr<DiscreteCameraPath>> paths;
+  for (const auto& layer : layers_) {
+    if (const Layer* top = layer.get();
+        top != nullptr && typeid(*top) == typeid(DiscreteCameraPath)) {
+      paths.push_back(std::static_pointer_cast<DiscreteCameraPath>(layer));
+    }
+  }
+  return paths;
+}
+
+void MyDocument::setTransformStacks(std::vector<std::shared_ptr<TransformStack>> stacks) {
+  changeValueForKey("transformStacks", transformStacks_, std::move(stacks));
 }
 
 // --- selection

@@ -1,6 +1,7 @@
 #pragma once
-// One open scene: the layer tree, the scene camera and light, the undo
-// manager, and the change reporting every edit ends in.
+// One open scene: the layer tree, the stored camera paths, the transform
+// stacks, the scene camera and light, the undo manager, and the change
+// reporting every edit ends in.
 //
 // Every scene edit ends in hasChanged, which redraws the document's views
 // (unless view updates are off) and posts the change notification the
@@ -21,9 +22,12 @@
 namespace cloudreel {
 
 class Camera;
+class CameraPath;
+class DiscreteCameraPath;
 class Layer;
 class LightSource;
 class SceneCamera;
+class TransformStack;
 
 inline constexpr std::string_view kDocumentChangeNotification =
     "KTPointDocument_DocumentChangeNotification";
@@ -45,8 +49,9 @@ class LayerOutline {
 
 class MyDocument : public Object, public Observer {
  public:
-  // No layers; a scene camera 15 units along +z named "Scene Camera"; a new
-  // light; view updates on.
+  // No layers and no stored camera paths; one new transform stack; a scene
+  // camera 15 units along +z named "Scene Camera"; a new light; view
+  // updates on.
   MyDocument();
   // Detaches every top-level layer.
   ~MyDocument() override;
@@ -85,6 +90,39 @@ class MyDocument : public Object, public Observer {
   void removeObjectFromLayersAtIndex(int index);
   // Appends the layer undoably and selects it.
   void addLayer(std::shared_ptr<Layer> layer);
+
+  // --- camera paths and transform stacks
+  // The camera paths added with addCameraPath: the list the document file
+  // keeps. They need not be in the layer tree, and those in it need not be
+  // here.
+  const std::vector<std::shared_ptr<CameraPath>>& storedCameraPaths() const { return cameraPaths_; }
+  // A plain store.
+  void setCameraPaths(std::vector<std::shared_ptr<CameraPath>> paths);
+  // Undoable ("New Camera Path", "Remove Camera Path"). Unlike the layer
+  // operations these neither attach nor detach the path and leave the
+  // outline alone. An index outside the list (past the end for an
+  // insertion) is logged and changes nothing.
+  void insertObjectInCameraPathsAtIndex(std::shared_ptr<CameraPath> path, int index);
+  void removeObjectFromCameraPathsAtIndex(int index);
+  // Appends to the stored list undoably, announced as a change of
+  // "cameraPaths".
+  void addCameraPath(std::shared_ptr<CameraPath> path);
+  // Not the stored list: a new list of every camera path in the layer tree,
+  // of any kind, depth first with each parent before its children.
+  std::vector<std::shared_ptr<CameraPath>> cameraPaths() const;
+  // Appends `layer` when it is a camera path, then the paths of its
+  // children in order. A layer found again below itself (a tree made into
+  // a loop) is not walked a second time, so the walk always ends.
+  static void addCameraPathsForLayer(const std::shared_ptr<Layer>& layer,
+                                     std::vector<std::shared_ptr<CameraPath>>& paths);
+  // The top-level layers whose class is exactly DiscreteCameraPath: its
+  // subclasses and nested paths do not count.
+  std::vector<std::shared_ptr<DiscreteCameraPath>> discretePaths() const;
+  const std::vector<std::shared_ptr<TransformStack>>& transformStacks() const {
+    return transformStacks_;
+  }
+  // A plain store.
+  void setTransformStacks(std::vector<std::shared_ptr<TransformStack>> stacks);
 
   // --- selection (not owned)
   std::shared_ptr<Layer> selectedLayer() const { return selectedLayer_.lock(); }
@@ -129,6 +167,8 @@ class MyDocument : public Object, public Observer {
   void reloadOutline();
 
   std::vector<std::shared_ptr<Layer>> layers_;
+  std::vector<std::shared_ptr<CameraPath>> cameraPaths_;
+  std::vector<std::shared_ptr<TransformStack>> transformStacks_;
   std::shared_ptr<SceneCamera> sceneCamera_;
   std::weak_ptr<Layer> selectedLayer_;
   std::weak_ptr<Camera> selectedCamera_;

@@ -2,26 +2,34 @@
 
 #include <gtest/gtest.h>
 
+#include "camera/discrete_camera_path.h"
 #include "camera/scene_camera.h"
+#include "camera/slerp_camera_path.h"
+#include "camera/transform_stack.h"
+#include "camera/zxy_camera_path.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
 
 namespace cloudreel {
 namespace {
 
-std::shared_ptr<Layer> namedLayer(std::string name) {
-  auto layer = std::make_shared<Layer>();
+template <class T = Layer>
+std::shared_ptr<T> namedLayer(std::string name) {
+  auto layer = std::make_shared<T>();
   layer->setName(std::move(name));
   return layer;
 }
 
-std::vector<std::string> namesOf(const std::vector<std::shared_ptr<Layer>>& layers) {
+template <class T>
+std::vector<std::string> namesOf(const std::vector<std::shared_ptr<T>>& layers) {
   std::vector<std::string> names;
   for (const auto& layer : layers) {
     names.push_back(layer->name());
   }
   return names;
 }
+
+using Names = std::vector<std::string>;
 
 // Counts the notifications of a name from one sender.
 struct NotificationCount : Observer {
@@ -38,6 +46,11 @@ struct CountingView : DocumentView {
   void setNeedsDisplay() override { ++redraws; }
 };
 
+struct CountingOutline : LayerOutline {
+  int reloads = 0;
+  void reloadData() override { ++reloads; }
+};
+
 TEST(MyDocument, ANewDocumentHasItsSceneCameraAndLight) {
   MyDocument document;
   EXPECT_TRUE(document.layers().empty());
@@ -47,68 +60,135 @@ TEST(MyDocument, ANewDocumentHasItsSceneCameraAndLight) {
   ASSERT_TRUE(document.lightSource());
   EXPECT_EQ(document.lightSource()->objectToWorld()->translationY(), 10.0f);
   EXPECT_TRUE(document.enableViewUpdates());
+  EXPECT_TRUE(document.storedCameraPaths().empty());
+  ASSERT_EQ(document.transformStacks().size(), 1u);
+  EXPECT_EQ(document.transformStacks()[0]->name(), "New stack");
 }
 
-TEST(MyDocument, AddingALayerUndoesAndRedoesAtTheSameIndex) {
-  MyDocument document;
-  document.addLayer(namedLayer("A"));
-  document.addLayer(namedLayer("C"));
-  const auto b = namedLayer("B");
-  document.undoManager().closeEventGroup();
-  document.insertObjectInLayersAtIndex(b, 1);
-  document.undoManager().closeEventGroup();
-  EXPECT_EQ(namesOf(document.layers()), (std::vector<std::string>{"A", "B", "C"}));
-  EXPECT_EQ(b->document(), &document);
-  EXPECT_EQ(document.undoManager().undoActionName(), "New Layer");
+// The document's two undoable lists. A layer is attached to the document
+// while it is in the list and the outline reloads with each change; a
+// stored camera path is neither attached nor shown in the outline.
+struct Collection {
+  std::string what;  // as the action names say it
+  std::string key;   // announced by the add operation
+  void (*add)(MyDocument&, std::shared_ptr<CameraPath>);
+  void (*insert)(MyDocument&, std::shared_ptr<CameraPath>, int);
+  void (*remove)(MyDocument&, int);
+  Names (*names)(const MyDocument&);
+  bool attaches;
+};
 
-  document.undoManager().undo();
-  EXPECT_EQ(namesOf(document.layers()), (std::vector<std::string>{"A", "C"}));
-  EXPECT_EQ(b->document(), nullptr);
-  EXPECT_EQ(document.undoManager().redoActionName(), "New Layer");
+TEST(MyDocument, ListEditsUndoAndRedoAtTheSameIndexUnderTheirNames) {
+  const Collection collections[] = {
+      {"Layer", "layers", [](MyDocument& d, std::shared_ptr<CameraPath> p) { d.addLayer(p); },
+       [](MyDocument& d, std::shared_ptr<CameraPath> p, int i) {
+         d.insertObjectInLayersAtIndex(p, i);
+       },
+       [](MyDocument& d, int i) { d.removeObjectFromLayersAtIndex(i); },
+       [](const MyDocument& d) { return namesOf(d.layers()); }, true},
+      {"Camera Path", "cameraPaths",
+       [](MyDocument& d, std::shared_ptr<CameraPath> p) { d.addCameraPath(p); },
+       [](MyDocument& d, std::shared_ptr<CameraPath> p, int i) {
+         d.insertObjectInCameraPathsAtIndex(p, i);
+       },
+       [](MyDocument& d, int i) { d.removeObjectFromCameraPathsAtIndex(i); },
+       [](const MyDocument& d) { return namesOf(d.storedCameraPaths()); }, false},
+  };
+  for (const Collection& c : collections) {
+    SCOPED_TRACE(c.what);
+    MyDocument document;
+    CountingOutline outline;
+    document.setOutlineView(&outline);
+    int announced = 0;
+    CallbackObserver observer([&](const auto&...) { ++announced; });
+    document.addObserver(observer, c.key, ObservingOptions::None, "");
+    UndoManager& undo = document.undoManager();
+    const auto a = namedLayer<SLERPCameraPath>("A");
+    const auto b = namedLayer<SLERPCameraPath>("B");
+    c.add(document, a);
+    c.add(document, namedLayer<SLERPCameraPath>("C"));
+    undo.closeEventGroup();
+    EXPECT_EQ(announced, 2);
+    NotificationCount changes(kDocumentChangeNotification, &document);
+    c.insert(document, b, 1);
+    undo.closeEventGroup();
+    EXPECT_EQ(c.names(document), (Names{"A", "B", "C"}));
+    EXPECT_EQ(b->document(), c.attaches ? &document : nullptr);
+    EXPECT_EQ(undo.undoActionName(), "New " + c.what);
+    undo.undo();
+    EXPECT_EQ(c.names(document), (Names{"A", "C"}));
+    EXPECT_EQ(b->document(), nullptr);
+    EXPECT_EQ(undo.redoActionName(), "New " + c.what);
+    undo.redo();
+    EXPECT_EQ(c.names(document), (Names{"A", "B", "C"}));
+    EXPECT_EQ(b->document(), c.attaches ? &document : nullptr);
 
-  document.undoManager().redo();
-  EXPECT_EQ(namesOf(document.layers()), (std::vector<std::string>{"A", "B", "C"}));
-  EXPECT_EQ(b->document(), &document);
-  // An attached layer's edits are undoable again.
-  b->setName("Bee");
-  document.undoManager().closeEventGroup();
-  EXPECT_EQ(document.undoManager().undoActionName(), "Change Name");
-}
+    c.remove(document, 0);
+    undo.closeEventGroup();
+    EXPECT_EQ(c.names(document), (Names{"B", "C"}));
+    EXPECT_EQ(a->document(), nullptr);
+    EXPECT_EQ(undo.undoActionName(), "Remove " + c.what);
+    // A layer out of the document is not the document's to undo; put back,
+    // it is again.
+    a->setName("Gone");
+    undo.closeEventGroup();
+    EXPECT_EQ(undo.undoActionName(), "Remove " + c.what);
+    undo.undo();
+    EXPECT_EQ(c.names(document), (Names{"Gone", "B", "C"}));
+    EXPECT_EQ(undo.redoActionName(), "Remove " + c.what);
+    a->setName("A");
+    undo.closeEventGroup();
+    EXPECT_EQ(undo.undoActionName(), c.attaches ? "Change Name" : "New " + c.what);
+    // Each edit, its undo and its redo reported a change.
+    EXPECT_EQ(changes.count, 5);
+    EXPECT_EQ(outline.reloads, c.attaches ? 7 : 0);
 
-TEST(MyDocument, RemovingALayerDetachesItAndUndoPutsItBack) {
-  MyDocument document;
-  const auto a = namedLayer("A");
-  document.addLayer(a);
-  document.addLayer(namedLayer("B"));
-  document.undoManager().closeEventGroup();
-  document.removeObjectFromLayersAtIndex(0);
-  document.undoManager().closeEventGroup();
-  EXPECT_EQ(a->document(), nullptr);
-  EXPECT_EQ(document.undoManager().undoActionName(), "Remove Layer");
-  // A detached layer's edits are not the document's to undo.
-  a->setName("Gone");
-  document.undoManager().closeEventGroup();
-  EXPECT_EQ(document.undoManager().undoActionName(), "Remove Layer");
-
-  document.undoManager().undo();
-  EXPECT_EQ(namesOf(document.layers()), (std::vector<std::string>{"Gone", "B"}));
-  EXPECT_EQ(a->document(), &document);
-}
-
-TEST(MyDocument, IndexesOutsideTheListChangeNothing) {
-  MyDocument document;
-  document.addLayer(namedLayer("A"));
-  document.undoManager().closeEventGroup();
-  document.undoManager().removeAllActions();
-  const auto stray = namedLayer("Stray");
-  for (const int index : {-1, 2, 1000}) {
-    document.insertObjectInLayersAtIndex(stray, index);
-    document.removeObjectFromLayersAtIndex(index);
+    // Indexes outside the list and a null object change nothing and leave
+    // no step to undo.
+    undo.removeAllActions();
+    const auto stray = namedLayer<SLERPCameraPath>("Stray");
+    for (const int index : {-1, 4, 1000}) {
+      c.insert(document, stray, index);
+      c.remove(document, index);
+    }
+    c.remove(document, 3);
+    c.insert(document, nullptr, 0);
+    EXPECT_EQ(c.names(document), (Names{"A", "B", "C"}));
+    EXPECT_EQ(stray->document(), nullptr);
+    EXPECT_FALSE(undo.canUndo());
+    document.removeObserver(observer, c.key);
   }
-  document.removeObjectFromLayersAtIndex(1);
-  EXPECT_EQ(namesOf(document.layers()), (std::vector<std::string>{"A"}));
-  EXPECT_EQ(stray->document(), nullptr);
-  EXPECT_FALSE(document.undoManager().canUndo());
+}
+
+TEST(MyDocument, CameraPathsAreGatheredFromTheTreeAndDiscretePathsFromTheTopOnly) {
+  MyDocument document;
+  // Group > (SLERP > ZXY, Inner > Discrete); then top-level Discrete, ZXY
+  // (a kind of discrete path) and a transform stack.
+  const auto group = namedLayer("Group");
+  const auto slerp = namedLayer<SLERPCameraPath>("S");
+  const auto inner = namedLayer("Inner");
+  const auto nestedDiscrete = namedLayer<DiscreteCameraPath>("nested D");
+  slerp->addChildLayer(namedLayer<ZXYCameraPath>("nested Z"));
+  inner->addChildLayer(nestedDiscrete);
+  group->addChildLayer(slerp);
+  group->addChildLayer(inner);
+  document.addLayer(group);
+  document.addLayer(namedLayer<DiscreteCameraPath>("D"));
+  document.addLayer(namedLayer<ZXYCameraPath>("Z"));
+  document.addLayer(namedLayer<TransformStack>("T"));
+  document.addCameraPath(namedLayer<SLERPCameraPath>("stored"));
+  const Names gathered = {"S", "nested Z", "nested D", "D", "Z", "T"};
+  EXPECT_EQ(namesOf(document.cameraPaths()), gathered);
+  EXPECT_EQ(namesOf(document.discretePaths()), (Names{"D"}));
+  EXPECT_EQ(namesOf(document.storedCameraPaths()), (Names{"stored"}));
+
+  // A tree looped back on itself ends the walk rather than the program.
+  inner->addChildLayer(group);
+  EXPECT_EQ(namesOf(document.cameraPaths()), gathered);
+  std::vector<std::shared_ptr<CameraPath>> paths;
+  MyDocument::addCameraPathsForLayer(inner, paths);
+  EXPECT_EQ(namesOf(paths), (Names{"nested D", "S", "nested Z"}));
+  inner->setChildLayers({nestedDiscrete});
 }
 
 TEST(MyDocument, LayerPropertyEditsBecomeNamedUndoSteps) {
