@@ -1,6 +1,7 @@
 #include "platform/keyed_archiver.h"
 
 #include <cbor/encoding.h>
+#include <fmt/format.h>
 
 #include "platform/atomic_file.h"
 #include "platform/log.h"
@@ -134,6 +135,11 @@ void KeyedArchiver::encodeBytes(std::span<const std::uint8_t> v, std::string_vie
   writeRaw(head, cbor_encode_bytestring_start(v.size(), head, sizeof head));
   // One transfer from the caller's memory; a file stream passes it straight on.
   writeRaw(v.data(), v.size());
+}
+
+void KeyedArchiver::encodePoint(Point2D p, std::string_view key) {
+  // fmt's plain "{}" is the shortest round-trip form: 0.1 stays "0.1".
+  encodeString(fmt::format("{{{}, {}}}", p.x, p.y), key);
 }
 
 void KeyedArchiver::writeObjectValue(const ObjectPtr& object) {

@@ -21,6 +21,7 @@
 
 #include "platform/byte_stream.h"
 #include "platform/error.h"
+#include "platform/plane.h"
 #include "platform/value.h"
 
 namespace cloudreel {
@@ -72,6 +73,9 @@ class KeyedArchiver {
   void encodeBool(bool v, std::string_view key);
   void encodeString(std::string_view v, std::string_view key);
   void encodeBytes(std::span<const std::uint8_t> v, std::string_view key);
+  // A point of the plane as the text "{x, y}", each coordinate in the
+  // shortest decimal form that reads back as the same double.
+  void encodePoint(Point2D p, std::string_view key);
   // A null object writes null. An object already written becomes a reference
   // to it; an object that contains itself fails the archive.
   void encodeObject(const ObjectPtr& object, std::string_view key);

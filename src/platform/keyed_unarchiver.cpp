@@ -2,6 +2,7 @@
 
 #include <bit>
 #include <cfloat>
+#include <charconv>
 #include <cmath>
 #include <cstring>
 #include <limits>
@@ -698,6 +699,61 @@ std::string KeyedUnarchiver::decodeStringForKey(std::string_view key) {
     return {};
   }
   return node->text;
+}
+
+namespace {
+
+// The text "{x, y}" that encodePoint writes; spaces around the numbers are
+// allowed, anything else is not. Nothing when the text is not of that form or
+// a number lies beyond the double range.
+std::optional<Point2D> parsePoint(std::string_view text) {
+  const char* p = text.data();
+  const char* const end = p + text.size();
+  auto skipSpaces = [&] {
+    while (p != end && *p == ' ') ++p;
+  };
+  auto expect = [&](char c) {
+    skipSpaces();
+    if (p == end || *p != c) {
+      return false;
+    }
+    ++p;
+    return true;
+  };
+  auto number = [&](double& v) {
+    skipSpaces();
+    const auto [next, ec] = std::from_chars(p, end, v);
+    p = next;
+    return ec == std::errc{};
+  };
+  Point2D point;
+  if (!expect('{') || !number(point.x) || !expect(',') || !number(point.y) || !expect('}') ||
+      p != end) {
+    return std::nullopt;
+  }
+  return point;
+}
+
+}  // namespace
+
+Point2D KeyedUnarchiver::decodePointForKey(std::string_view key) {
+  const Node* node = failed_ ? nullptr : find(key);
+  if (node == nullptr || node->type == ArchiveValueType::Null) {
+    return {};
+  }
+  if (node->type != ArchiveValueType::String) {
+    failWrongType(key, "a point");
+    return {};
+  }
+  const std::optional<Point2D> point = parsePoint(node->text);
+  if (!point) {
+    failWithError(
+        makeArchiveError(ArchiveError::WrongType, "the key \"" + std::string(key) + "\" of " +
+                                                      where() + " holds the string \"" +
+                                                      node->text + "\", not a point \"{x, y}\""));
+    return {};
+  }
+  return *point;
 }
 
 bool KeyedUnarchiver::readBytes(const Node& node, std::uint8_t* destination) {

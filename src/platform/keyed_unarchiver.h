@@ -32,6 +32,7 @@
 #include "platform/error.h"
 #include "platform/keyed_archiver.h"
 #include "platform/object.h"
+#include "platform/plane.h"
 #include "platform/value.h"
 
 namespace cloudreel {
@@ -75,6 +76,9 @@ class KeyedUnarchiver {
   double decodeDoubleForKey(std::string_view key);
   bool decodeBoolForKey(std::string_view key);  // a number reads as YES when non-zero
   std::string decodeStringForKey(std::string_view key);
+  // A point written by encodePoint; missing or null reads as (0, 0). Any
+  // other value, or a string not of the form "{x, y}", fails the decode.
+  Point2D decodePointForKey(std::string_view key);
   Bytes decodeBytesForKey(std::string_view key);
   // The length of a byte string, or nothing when the key holds none; lets a
   // big owner allocate its storage and read straight into it.

@@ -19,6 +19,7 @@
 #include "scene/point_3d.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
+#include "timeline/spline.h"
 
 namespace cloudreel {
 
@@ -43,6 +44,8 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<CameraField>("CameraField");
   registry.registerClass<TransformStack>("TransformStack");
   registry.registerClass<TransformStackMember>("TransformStackMember");
+  registry.registerClass<SplinePoint>("SplinePoint");
+  registry.registerClass<Spline>("Spline");
 }
 
 }  // namespace cloudreel

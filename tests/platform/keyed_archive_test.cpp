@@ -188,6 +188,20 @@ TEST(KeyedArchive, TopLevelValuesRoundTripIncludingExtremes) {
                               &KeyedUnarchiver::decodeBytesForKey);
 }
 
+TEST(KeyedArchive, PointsRoundTripAsTheirShortestDecimalText) {
+  const Point2D points[] = {{0.1, -1e-300}, {-0.0, DBL_MAX}, {DBL_TRUE_MIN, -HUGE_VAL}};
+  TopLevel archive([&](KeyedArchiver& a) {
+    for (std::size_t i = 0; i < 3; ++i) a.encodePoint(points[i], std::to_string(i));
+    a.encodeString("{ 0.5 ,2 }", "spaced");
+  });
+  KeyedUnarchiver& c = *archive.coder;
+  for (std::size_t i = 0; i < 3; ++i) EXPECT_EQ(c.decodePointForKey(std::to_string(i)), points[i]);
+  EXPECT_TRUE(std::signbit(c.decodePointForKey("1").x));
+  EXPECT_EQ(c.decodeStringForKey("0"), "{0.1, -1e-300}");
+  EXPECT_EQ(c.decodePointForKey("spaced"), (Point2D{0.5, 2}));
+  EXPECT_FALSE(c.hasFailed());
+}
+
 TEST(KeyedArchive, NumbersConvertBetweenKinds) {
   TopLevel archive([](KeyedArchiver& a) {
     a.encodeFloat(0.1f, "single");
@@ -231,6 +245,11 @@ TEST(KeyedArchive, ReadingAValueAsAKindItCannotBeFailsTheDecode) {
       {"list as dictionary", [&](auto& a) { a.encodeList(none, "v"); }, &U::decodeDictionaryForKey},
       {"Color as Sample", [](auto& a) { a.encodeObject(Color::colorWithRGBA(1, 0, 0), "v"); },
        &U::decodeObjectOfClassForKey<Sample>},
+      {"int as point", [](auto& a) { a.encodeInt32(1, "v"); }, &U::decodePointForKey},
+      {"unclosed point", [](auto& a) { a.encodeString("{1, 2", "v"); }, &U::decodePointForKey},
+      {"point and more", [](auto& a) { a.encodeString("{1, 2}x", "v"); }, &U::decodePointForKey},
+      {"point beyond double", [](auto& a) { a.encodeString("{1e999, 0}", "v"); },
+       &U::decodePointForKey},
       {"bytes of another length", [](auto& a) { a.encodeBytes(Bytes(4), "v"); },
        [](U& c, std::string_view key) {
          Bytes b(5);
@@ -268,6 +287,7 @@ TEST(KeyedArchive, MissingAndNullKeysReadAsZeroValues) {
     EXPECT_FALSE(c.decodeDictionaryForKey(key).has_value());
     EXPECT_FALSE(c.bytesLengthForKey(key).has_value());
     EXPECT_EQ(c.typeOfValueForKey(key), ArchiveValueType::Null);
+    EXPECT_EQ(c.decodePointForKey(key), Point2D{});
   }
   EXPECT_FALSE(c.containsValueForKey("missing"));
   EXPECT_TRUE(c.containsValueForKey("nothing"));
