@@ -13,6 +13,8 @@
 #include "render/affine_transform_gl.h"
 #include "render/gl/display_list.h"
 #include "render/render_options.h"
+#include "timeline/affine_track.h"
+#include "timeline/float_value_track.h"
 
 namespace cloudreel {
 
@@ -231,6 +233,14 @@ void Camera::drawGLCameraBodyWithSize(float size) {
   glScalef(size, size, size);
   body->callOrCompile(drawCameraBody);
   glPopMatrix();
+}
+
+void Camera::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  const ObjectPtr self = weak_from_this().lock();
+  tracks.push_back(std::make_shared<AffineTrack>(self, "Transform"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "fieldOfView", "Field Of View"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "zNear", "Near Z Plane"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "zFar", "Far Z Plane"));
 }
 
 void Camera::encodeWithCoder(KeyedArchiver& coder) const {

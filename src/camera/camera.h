@@ -121,6 +121,9 @@ class Camera : public Animatable3DObject {
 
   // After the base keys: "name", "fieldOfView", "zNear", "zFar". A missing
   // "zNear" reads as 1 and a missing "zFar" as 30.
+  // A "Transform" track, then "Field Of View", "Near Z Plane" and "Far Z
+  // Plane".
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
   void encodeWithCoder(KeyedArchiver& coder) const override;
   void initWithCoder(KeyedUnarchiver& coder) override;
 

@@ -9,6 +9,7 @@
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
 #include "render/render_options.h"
+#include "timeline/float_value_track.h"
 
 namespace cloudreel {
 
@@ -102,6 +103,13 @@ void CameraField::copyInto(Animatable3DObject& target) const {
   copy.setDrawFrustum(drawFrustum_);
   copy.setVariableOpacity(variableOpacity_);
   copy.setVariableExponent(variableExponent_);
+}
+
+void CameraField::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  CameraPath::getAnimatablePropsInArray(tracks);
+  const ObjectPtr self = weak_from_this().lock();
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "frustumLength", "Frustum Length"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "imageOpacity", "Image Opacity"));
 }
 
 void CameraField::encodeWithCoder(KeyedArchiver& coder) const {

@@ -57,6 +57,8 @@ class CameraField : public CameraPath {
 
   // After the path keys: "cameras", the list. The display settings are not
   // archived.
+  // The path's tracks, then "Frustum Length" and "Image Opacity".
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
   void encodeWithCoder(KeyedArchiver& coder) const override;
   void initWithCoder(KeyedUnarchiver& coder) override;
 

@@ -124,6 +124,8 @@ void Animatable3DObject::addObserversForDocument(MyDocument* document) { documen
 
 void Animatable3DObject::removeObserversForDocument(MyDocument*) { document_ = nullptr; }
 
+void Animatable3DObject::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>&) {}
+
 void Animatable3DObject::changeKeyPathOfObjectToValue(std::string_view keyPath, Object& object,
                                                       const Value& value) {
   object.setValueForKeyPath(value, keyPath);

@@ -18,6 +18,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "geometry/affine_transform.h"
 #include "platform/object.h"
@@ -25,6 +26,7 @@
 namespace cloudreel {
 
 class MyDocument;
+class TimelineTrack;
 
 class Animatable3DObject : public Object, public Observer {
  public:
@@ -71,6 +73,10 @@ class Animatable3DObject : public Object, public Observer {
   // the document observe their undoable properties. Detaching undoes both.
   virtual void addObserversForDocument(MyDocument* document);
   virtual void removeObserversForDocument(MyDocument* document);
+
+  // Appends the tracks the timeline can offer for the object's animatable
+  // properties, each bound to this object; an object with none adds none.
+  virtual void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks);
 
   // The undo target of every generic property change: sets the value by key
   // path on the object, then tells the document it has changed.

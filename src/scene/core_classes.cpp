@@ -19,7 +19,14 @@
 #include "scene/point_3d.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
+#include "timeline/affine_clip.h"
+#include "timeline/affine_track.h"
+#include "timeline/float_clips.h"
+#include "timeline/float_value_track.h"
 #include "timeline/spline.h"
+#include "timeline/timeline.h"
+#include "timeline/timeline_track.h"
+#include "timeline/vector_clips.h"
 
 namespace cloudreel {
 
@@ -46,6 +53,18 @@ void registerCoreClasses(ClassRegistry& registry) {
   registry.registerClass<TransformStackMember>("TransformStackMember");
   registry.registerClass<SplinePoint>("SplinePoint");
   registry.registerClass<Spline>("Spline");
+  registry.registerClass<TimelineClip>("TimelineClip");
+  registry.registerClass<SingleValueClip>("SingleValueClip");
+  registry.registerClass<AnimatedValueClip>("AnimatedValueClip");
+  registry.registerClass<TweenClip>("TweenClip");
+  registry.registerClass<SlerpClip>("SlerpClip");
+  registry.registerClass<Vector3Clip>("Vector3Clip");
+  registry.registerClass<AffineClip>("AffineClip");
+  registry.registerClass<TimelineTrack>("TimelineTrack");
+  registry.registerClass<TimecodeTrack>("TimecodeTrack");
+  registry.registerClass<FloatValueTrack>("FloatValueTrack");
+  registry.registerClass<AffineTrack>("AffineTrack");
+  registry.registerClass<Timeline>("Timeline");
 }
 
 }  // namespace cloudreel

@@ -13,6 +13,7 @@
 #include "render/gl/shapes.h"
 #include "render/render_options.h"
 #include "scene/my_document.h"
+#include "timeline/affine_track.h"
 
 namespace cloudreel {
 
@@ -80,6 +81,10 @@ void Layer::addChildLayer(std::shared_ptr<Layer> child) {
 }
 
 void Layer::setFrameForTime(float) {}
+
+void Layer::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  tracks.push_back(std::make_shared<AffineTrack>(weak_from_this().lock(), "Transform"));
+}
 
 void Layer::multiplyTransformByQuaternion(const std::array<double, 4>&) {}
 
@@ -232,6 +237,12 @@ const PropertyTable& AnimatedLayer::properties() const {
        property<AnimatedLayer>("FPS", &AnimatedLayer::FPS, &AnimatedLayer::setFPS),
        readOnlyProperty<AnimatedLayer>("durationInSeconds", &AnimatedLayer::durationInSeconds)});
   return table;
+}
+
+void AnimatedLayer::getAnimatablePropsInArray(
+    std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  Layer::getAnimatablePropsInArray(tracks);
+  tracks.push_back(std::make_shared<TimelineTrack>(weak_from_this().lock(), "frame", "Time"));
 }
 
 std::shared_ptr<Animatable3DObject> AnimatedLayer::makeBlank() const {

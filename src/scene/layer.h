@@ -78,6 +78,8 @@ class Layer : public Animatable3DObject {
   virtual std::size_t byteSize() const { return 0; }
   // Hooks for layers that animate by themselves; the base does nothing.
   virtual void setFrameForTime(float seconds);
+  // A "Transform" track driving the animation transform.
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
   virtual void multiplyTransformByQuaternion(const std::array<double, 4>& q);
 
   // Posts a notification with this layer as object on the default centre;
@@ -155,6 +157,9 @@ class AnimatedLayer : public Layer {
   float durationInSeconds() const {
     return static_cast<float>(nFrames_) / static_cast<float>(FPS_);
   }
+  // The layer's tracks, then a "Time" track driving the frame through
+  // setFrameForTime (subclasses provide the "frame" property).
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
 
   // "nFrames" and "FPS" after the layer keys; a missing "FPS" reads as 0.
   void encodeWithCoder(KeyedArchiver& coder) const override;

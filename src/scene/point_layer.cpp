@@ -17,6 +17,7 @@
 #include "platform/user_interaction.h"
 #include "render/point_drawing.h"
 #include "scene/my_document.h"
+#include "timeline/float_value_track.h"
 
 namespace cloudreel {
 
@@ -232,6 +233,14 @@ void PointLayer::setFixedColor(std::shared_ptr<Color> v) {
 
 std::size_t PointLayer::byteSize() const {
   return nPoints_ > 0 ? static_cast<std::size_t>(nPoints_) * 16 : 0;
+}
+
+void PointLayer::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  Layer::getAnimatablePropsInArray(tracks);
+  const ObjectPtr self = weak_from_this().lock();
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "pointSize", "Point Size"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "opacity", "Opacity"));
+  tracks.push_back(std::make_shared<FloatValueTrack>(self, "bucketLimit", "Bucket Limit"));
 }
 
 void PointLayer::addObserversForDocument(MyDocument* document) {

@@ -212,6 +212,9 @@ class PointLayer : public Layer {
   std::size_t byteSize() const override;
 
   // Also makes the document observe "pointSize" ("Change Point Size").
+  // The layer's "Transform" track, then "Point Size", "Opacity" and
+  // "Bucket Limit".
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
   void addObserversForDocument(MyDocument* document) override;
   void removeObserversForDocument(MyDocument* document) override;
 

@@ -9,6 +9,7 @@
 #include "platform/log.h"
 #include "render/gl/shapes.h"
 #include "scene/my_document.h"
+#include "timeline/float_value_track.h"
 
 namespace cloudreel {
 
@@ -110,6 +111,11 @@ void Sphere::setSize(float size) {
 
 void Sphere::setColor(std::shared_ptr<Color> color) {
   changeValueForKey("color", color_, color ? std::move(color) : white());
+}
+
+void Sphere::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+  Layer::getAnimatablePropsInArray(tracks);
+  tracks.push_back(std::make_shared<FloatValueTrack>(weak_from_this().lock(), "size", "Size"));
 }
 
 void Sphere::addObserversForDocument(MyDocument* document) {

@@ -61,6 +61,8 @@ class Sphere : public Layer {
 
   // The document also observes "shape", "size", "segments" and "color" for
   // undo ("Change Shape", "Change Size", "Change Segments", "Change Colour").
+  // The layer's "Transform" track, then "Size".
+  void getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) override;
   void addObserversForDocument(MyDocument* document) override;
   void removeObserversForDocument(MyDocument* document) override;
 

@@ -52,4 +52,25 @@ std::shared_ptr<T> decodeFrom(std::string_view className,
       KeyedArchiver::archivedDataWithRootObject(std::make_shared<Partial>(className, write)));
 }
 
+// Several objects archived side by side at the top level, as a document
+// stores its layers beside the timeline that refers to them, and read back
+// with one unarchiver so shared references resolve to the same objects.
+struct TopLevelArchive {
+  explicit TopLevelArchive(const std::function<void(KeyedArchiver&)>& encode) {
+    registerCoreClasses(ClassRegistry::shared());
+    MemoryOutputStream out;
+    KeyedArchiver archiver(out);
+    encode(archiver);
+    EXPECT_TRUE(archiver.finish(nullptr));
+    data = out.takeBytes();
+    in = std::make_unique<MemoryInputStream>(data);
+    Error error;
+    coder = KeyedUnarchiver::open(*in, &error);
+    EXPECT_NE(coder, nullptr) << error.message;
+  }
+  Bytes data;
+  std::unique_ptr<MemoryInputStream> in;
+  std::unique_ptr<KeyedUnarchiver> coder;
+};
+
 }  // namespace cloudreel::testing
