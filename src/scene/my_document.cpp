@@ -11,6 +11,7 @@
 #include "platform/run_loop.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
+#include "timeline/timeline.h"
 
 namespace cloudreel {
 
@@ -42,6 +43,7 @@ MyDocument::MyDocument()
       lightSource_(std::make_shared<LightSource>()),
       undoManager_(&RunLoop::main()) {
   sceneCamera_->setName("Scene Camera");
+  timeline_ = std::make_shared<Timeline>();
   transformStacks_.push_back(std::make_shared<TransformStack>());
   NotificationCenter::defaultCenter().addObserver(
       *this, std::string(kGridColorChangedNotification), nullptr,

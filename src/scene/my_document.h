@@ -27,6 +27,7 @@ class DiscreteCameraPath;
 class Layer;
 class LightSource;
 class SceneCamera;
+class Timeline;
 class TransformStack;
 
 inline constexpr std::string_view kDocumentChangeNotification =
@@ -124,6 +125,9 @@ class MyDocument : public Object, public Observer {
   // A plain store.
   void setTransformStacks(std::vector<std::shared_ptr<TransformStack>> stacks);
 
+  // --- the animation: a new document's timeline holds the ruler alone.
+  const std::shared_ptr<Timeline>& timeline() const { return timeline_; }
+
   // --- selection (not owned)
   std::shared_ptr<Layer> selectedLayer() const { return selectedLayer_.lock(); }
   // Tells the old layer it is deselected and the new one it is selected.
@@ -169,6 +173,7 @@ class MyDocument : public Object, public Observer {
   std::vector<std::shared_ptr<Layer>> layers_;
   std::vector<std::shared_ptr<CameraPath>> cameraPaths_;
   std::vector<std::shared_ptr<TransformStack>> transformStacks_;
+  std::shared_ptr<Timeline> timeline_;
   std::shared_ptr<SceneCamera> sceneCamera_;
   std::weak_ptr<Layer> selectedLayer_;
   std::weak_ptr<Camera> selectedCamera_;

@@ -140,7 +140,7 @@ TEST(Timeline, AnimatesAScenePropertyByPropertyAndSurvivesTheArchive) {
   document.addLayer(path);
   document.undoManager().removeAllActions();
 
-  const auto timelineObject = std::make_shared<Timeline>();
+  const auto timelineObject = document.timeline();
   Timeline& timeline = *timelineObject;
   std::vector<std::shared_ptr<TimelineTrack>> offered;
   layer->getAnimatablePropsInArray(offered);
