@@ -106,10 +106,6 @@ float TimelineClip::rampValueForClipTime(float ct, float c) const {
 
 void TimelineClip::highlightFrameForTime(float) {}
 
-bool TimelineClip::intersectsWithTime(float t) const {
-  return !isControlPoint_ && begin_ <= t && t < begin_ + duration_;
-}
-
 bool TimelineClip::isControlPointAtTime(float t) const {
   // The difference is taken in single precision, the comparison in double.
   return isControlPoint_ && static_cast<double>(std::fabs(begin_ - t)) < 0.00001;

@@ -92,8 +92,11 @@ class TimelineClip : public Object, public Observer {
   virtual void highlightFrameForTime(float t);
 
   // --- hit tests
-  // Half-open: begin <= t < end; never true for a control point.
-  bool intersectsWithTime(float t) const;
+  // Half-open: begin <= t < end; never true for a control point. Inline:
+  // every application of a track scans its list with it.
+  bool intersectsWithTime(float t) const {
+    return !isControlPoint_ && begin_ <= t && t < begin_ + duration_;
+  }
   // A control point within 0.00001 s of t.
   bool isControlPointAtTime(float t) const;
   bool isControlPointWithin(float d, float t) const;
