@@ -29,9 +29,7 @@
 #include "camera/bundler_camera.h"
 #include "camera/camera_field.h"
 #include "import/bundler_file.h"
-#include "platform/application_defaults.h"
-#include "platform/log.h"
-#include "platform/user_defaults.h"
+#include "fuzz_setup.h"
 #include "scratch_file.h"
 
 namespace {
@@ -94,12 +92,7 @@ void add(double& sum, double v) { sum += std::isfinite(v) ? v : 1.0; }
 }  // namespace
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  // The factory settings in memory, so no user's configuration is read, and
-  // a silent log: a failed import presents its error through the log.
-  auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
-  registerApplicationDefaults(*defaults);
-  UserDefaults::setStandardUserDefaults(std::move(defaults));
-  setLogSink([](std::string_view) {});
+  fuzz::useFactoryDefaultsAndSilentLog();
   (void)reconstruction();
   return 0;
 }

@@ -10,10 +10,8 @@
 #include <cstdlib>
 #include <memory>
 
-#include "platform/application_defaults.h"
-#include "platform/log.h"
-#include "platform/user_defaults.h"
 #include "scene/point_layer.h"
+#include "fuzz_setup.h"
 #include "scratch_file.h"
 
 namespace {
@@ -28,12 +26,7 @@ fuzz::ScratchFile& pointFile() {
 }  // namespace
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  // The factory settings in memory, so no user's configuration is read, and
-  // a silent log: the loader logs every face count and every freed layer.
-  auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
-  registerApplicationDefaults(*defaults);
-  UserDefaults::setStandardUserDefaults(std::move(defaults));
-  setLogSink([](std::string_view) {});
+  fuzz::useFactoryDefaultsAndSilentLog();
   (void)pointFile();
   return 0;
 }

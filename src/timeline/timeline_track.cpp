@@ -225,52 +225,50 @@ bool TimelineTrack::insertClipInSequenceAt(std::shared_ptr<TimelineClip> clip, f
   return true;
 }
 
-void TimelineTrack::ensureControlPointAt(float t) {
-  if (!controlPointForTime(t)) {
-    addEditAtTime(t);
+bool TimelineTrack::controlPointsAt(float a, float b, int& ia, int& ib) {
+  for (float t : {a, b}) {
+    if (!controlPointForTime(t)) {
+      addEditAtTime(t);
+    }
+  }
+  // Both indices are taken once both points exist: the second split may
+  // have moved the first point along the list.
+  ia = indexOfClip(controlPointForTime(a).get());
+  ib = indexOfClip(controlPointForTime(b).get());
+  // A bound in no span has no control point: nothing to take out. Nor is
+  // there when the point at b comes first in the list.
+  return ia >= 0 && ib > 0;
+}
+
+void TimelineTrack::removeBetween(int ia, int ib) {
+  // Of the elements strictly between the points, the last one stays.
+  const int first = ia + 1;
+  const int last = ib - 1;
+  if (last - first > 0) {
+    sequencedClips_.erase(sequencedClips_.begin() + first, sequencedClips_.begin() + last);
   }
 }
 
 void TimelineTrack::liftFrom(float a, float b) {
-  ensureControlPointAt(a);
-  ensureControlPointAt(b);
-  // Both indices are taken once both points exist: the second split may
-  // have moved the first point along the list.
-  const int ia = indexOfClip(controlPointForTime(a).get());
-  const int ib = indexOfClip(controlPointForTime(b).get());
-  // A bound in no span has no control point: nothing to lift.
-  if (ia < 0 || ib < 0) {
-    return;
+  int ia = 0;
+  int ib = 0;
+  if (controlPointsAt(a, b, ia, ib)) {
+    removeBetween(ia, ib);
   }
-  const int i = ia + 1;
-  const int j = ib - 1;
-  if (j < 0 || j - i <= 0) {
-    return;
-  }
-  sequencedClips_.erase(sequencedClips_.begin() + i, sequencedClips_.begin() + j);
 }
 
 void TimelineTrack::cutFrom(float a, float b) {
-  ensureControlPointAt(a);
-  ensureControlPointAt(b);
-  const int ia = indexOfClip(controlPointForTime(a).get());
-  const int ib = indexOfClip(controlPointForTime(b).get());
-  if (ia < 0 || ib < 0) {
+  int ia = 0;
+  int ib = 0;
+  if (!controlPointsAt(a, b, ia, ib)) {
     return;
   }
-  const int j = ib - 1;
-  if (j < 0) {
-    return;
-  }
-  for (std::size_t i = static_cast<std::size_t>(j) + 1; i < sequencedClips_.size(); ++i) {
+  for (std::size_t i = static_cast<std::size_t>(ib); i < sequencedClips_.size(); ++i) {
     TimelineClip& later = *sequencedClips_[i];
     logf("moving clip %s at %0.2f", later.description(), later.begin());
     later.adjustBeginTime(a - b);
   }
-  const int first = ia + 1;
-  if (j - first > 0) {
-    sequencedClips_.erase(sequencedClips_.begin() + first, sequencedClips_.begin() + j);
-  }
+  removeBetween(ia, ib);
 }
 
 // --- applying

@@ -134,8 +134,12 @@ class TimelineTrack : public Object {
   void initWithCoder(KeyedUnarchiver& coder) override;
 
  private:
-  // Adds an edit at t unless a control point is there already.
-  void ensureControlPointAt(float t);
+  // Adds an edit at a and at b unless a control point is there already,
+  // then finds the two points' indices; false when there is nothing
+  // between them to take out (a bound in no span).
+  bool controlPointsAt(float a, float b, int& ia, int& ib);
+  // Removes the elements between the points at ia and ib but the last.
+  void removeBetween(int ia, int ib);
 
   ClipList sequencedClips_;
   std::int32_t fpsTimes100_ = 2500;

@@ -43,13 +43,6 @@ const PropertyTable& TweenClip::properties() const {
 
 std::shared_ptr<TimelineClip> TweenClip::makeBlank() const { return std::make_shared<TweenClip>(); }
 
-std::shared_ptr<TweenClip> TweenClip::makeSpan(float begin, float duration) const {
-  auto span = std::make_shared<TweenClip>();
-  span->setBegin(begin);
-  span->setDuration(duration);
-  return span;
-}
-
 void TweenClip::setValueBegin(std::shared_ptr<Vector3> v) {
   changeValueForKey("valueBegin", valueBegin_, copyOf(v));
 }
@@ -81,7 +74,11 @@ std::shared_ptr<TimelineClip> TweenClip::splitClipInSequence(TimelineTrack& trac
   logSplit(track, t);
   const float rest = duration() - (t - begin());
   const auto v = objectAs<Vector3>(objectValueForSequenceTime(t));
-  std::shared_ptr<TweenClip> span = makeSpan(t, rest);
+  // A blank clip of the receiver's own kind, so a rotation tween splits
+  // into rotation tweens.
+  auto span = std::static_pointer_cast<TweenClip>(makeBlank());
+  span->setBegin(t);
+  span->setDuration(rest);
   span->setValueEnd(valueEnd_);
   setValueEnd(v);
   span->setValueBegin(v);
@@ -111,13 +108,6 @@ void TweenClip::initWithCoder(KeyedUnarchiver& coder) {
 // --- SlerpClip
 
 std::shared_ptr<TimelineClip> SlerpClip::makeBlank() const { return std::make_shared<SlerpClip>(); }
-
-std::shared_ptr<TweenClip> SlerpClip::makeSpan(float begin, float duration) const {
-  auto span = std::make_shared<SlerpClip>();
-  span->setBegin(begin);
-  span->setDuration(duration);
-  return span;
-}
 
 ObjectPtr SlerpClip::objectValueForSequenceTime(float t) const {
   if (!valueBegin() || !valueEnd()) {

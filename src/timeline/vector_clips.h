@@ -42,8 +42,6 @@ class TweenClip : public TimelineClip {
   std::shared_ptr<TimelineClip> makeBlank() const override;
   // The log line of a split, with the track and the time.
   virtual void logSplit(const TimelineTrack& track, float t) const;
-  // A new span of the receiver's kind for the second half of a split.
-  virtual std::shared_ptr<TweenClip> makeSpan(float begin, float duration) const;
 
  private:
   std::shared_ptr<Vector3> valueBegin_;
@@ -69,7 +67,6 @@ class SlerpClip : public TweenClip {
  protected:
   std::shared_ptr<TimelineClip> makeBlank() const override;
   void logSplit(const TimelineTrack& track, float t) const override;
-  std::shared_ptr<TweenClip> makeSpan(float begin, float duration) const override;
 };
 
 class Vector3Clip : public TimelineClip {
