@@ -4,8 +4,6 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <cstring>
-#include <fstream>
 #include <optional>
 #include <string>
 
@@ -16,9 +14,10 @@
 #include "camera/slerp_camera_path.h"
 #include "camera/zxy_camera_path.h"
 #include "geometry/rotations.h"
-#include "platform/application_defaults.h"
 #include "render/render_options.h"
 #include "scene/archive_helpers.h"
+#include "support/memory_defaults.h"
+#include "support/near.h"
 #include "support/pixel_harness.h"
 #include "support/temp_dir.h"
 
@@ -26,30 +25,19 @@ namespace cloudreel {
 namespace {
 
 using Matrix = AffineTransform::Matrix;
+// Registered defaults (a frame rate of 25), so paths do not read the user's
+// own settings.
+using testing::MemoryDefaults;
 
-// Registered defaults in memory (a frame rate of 25) for the life of the
-// object, so paths do not read the user's own settings.
-struct MemoryDefaults {
-  MemoryDefaults()
-      : previous(UserDefaults::setStandardUserDefaults(
-            std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>()))) {
-    registerApplicationDefaults(UserDefaults::standardUserDefaults());
-  }
-  ~MemoryDefaults() { UserDefaults::setStandardUserDefaults(std::move(previous)); }
-  std::unique_ptr<UserDefaults> previous;
-};
+std::array<double, 3> positionOf(const Camera& camera) {
+  return testing::applied(*camera.objectToWorld(), {0, 0, 0});
+}
 
 void expectPose(const std::shared_ptr<Camera>& camera, const Matrix& orientation,
                 const std::array<double, 3>& position, double tolerance = 0) {
   ASSERT_NE(camera, nullptr);
-  for (std::size_t i = 0; i < 16; ++i) {
-    EXPECT_NEAR(camera->inertialToObject()->mx()[i], orientation[i], tolerance) << "element " << i;
-  }
-  std::array<double, 3> at{};
-  camera->objectToWorld()->getTranslation(at);
-  for (std::size_t i = 0; i < 3; ++i) {
-    EXPECT_NEAR(at[i], position[i], tolerance) << "position " << i;
-  }
+  testing::expectNear(camera->inertialToObject()->mx(), orientation, tolerance, "orientation");
+  testing::expectNear(positionOf(*camera), position, tolerance, "position");
 }
 
 const char* const kTwoMatrices =
@@ -63,8 +51,8 @@ constexpr Matrix kSecondOrientation = {0, 1, 0, 0.5, -1, 0, 0, 0.25, 0, 0, 1, 0.
 TEST(DiscreteCameraPath, EachMatrixLineIsAFramesOrientationAndScaledPosition) {
   const MemoryDefaults defaults;
   const testing::TempDir dir;
-  std::ofstream(dir / "walk.txt") << kTwoMatrices;
-  const auto path = DiscreteCameraPath::initWithURL(dir / "walk.txt");
+  const auto path =
+      DiscreteCameraPath::initWithURL(testing::writeFile(dir / "walk.txt", kTwoMatrices));
   ASSERT_NE(path, nullptr);
   EXPECT_EQ(path->name(), "walk.txt");
   EXPECT_EQ(path->nFrames(), 2);
@@ -143,7 +131,7 @@ TEST(DiscreteCameraPath, DamagedOrHostileTextNeverOverreadsOrOverallocates) {
 TEST(SLERPCameraPath, RunsFromTheStartPoseAtFrameZeroToTheEndPoseAtTheLastFrame) {
   const MemoryDefaults defaults;
   SLERPCameraPath path;
-  EXPECT_EQ(path.nFrames(), 200);
+  ASSERT_EQ(path.nFrames(), 200);
   path.setFrTranslate(Vector3::vectorWithXYZ(1, 2, 3));
   path.setToTranslate(Vector3::vectorWithXYZ(11, -2, 3));
   path.setToRotate(Vector3::vectorWithXYZ(0, 0, 90));
@@ -210,9 +198,8 @@ TEST(CameraPath, EveryKindComesBackFromTheArchiveHandingOutTheSameCameras) {
     for (const float t : {0.0f, 0.3f, 0.6f}) {
       const auto camera = path->cameraInObjectSpaceForTime(t);
       ASSERT_NE(camera, nullptr);
-      std::array<double, 3> at{};
-      camera->objectToWorld()->getTranslation(at);
-      expectPose(back->cameraInObjectSpaceForTime(t), camera->inertialToObject()->mx(), at, 1e-6);
+      expectPose(back->cameraInObjectSpaceForTime(t), camera->inertialToObject()->mx(),
+                 positionOf(*camera), 1e-6);
     }
   }
   EXPECT_EQ(std::dynamic_pointer_cast<CameraField>(testing::roundTrip(field))->frustumLength(),

@@ -8,33 +8,22 @@
 #include <functional>
 #include <optional>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "camera/scene_camera.h"
-#include "platform/application_defaults.h"
 #include "platform/notification_center.h"
 #include "render/opengl_scene.h"
 #include "render/render_options.h"
 #include "scene/archive_helpers.h"
+#include "support/memory_defaults.h"
+#include "support/near.h"
 #include "support/pixel_harness.h"
 
 namespace cloudreel {
 namespace {
 
 using Point = std::array<double, 3>;
-
-Point applied(const AffineTransform& t, Point p) {
-  t.multiply3Vector(p);
-  return p;
-}
-
-void expectNear(const Point& actual, const Point& expected, const std::string& what) {
-  for (std::size_t i = 0; i < 3; ++i) {
-    EXPECT_NEAR(actual[i], expected[i], 1e-6) << what << ", component " << i;
-  }
-}
-
+using testing::applied;
 using testing::roundTrip;
 
 // What a camera sees through and from where, in one comparable line.
@@ -69,8 +58,6 @@ TEST(Camera, NewCopiedAndDecodedCamerasGetTheirLensAsTheyShould) {
     std::shared_ptr<Camera> camera;
     std::string seen;
   } cases[] = {
-      {std::make_shared<Camera>(),
-       "Camera Camera fov 30 near 1 far 30 aspect 1 at Vector3: <0.00, 0.00, 0.00>"},
       {Camera::initWithZDistance(10),
        "Camera Camera fov 30 near 1 far 30 aspect 1 at Vector3: <0.00, 0.00, 10.00>"},
       {placed, "Camera Camera fov 30 near 1 far 30 aspect 1 at Vector3: <1.00, -2.00, 3.00>"},
@@ -126,8 +113,8 @@ TEST(SceneCamera, EachAngleTurnsAboutItsOwnAxisAndResetsTheTranslation) {
     SceneCamera camera;
     camera.inertialToObject()->setTranslation({1, 2, 3});
     c.set(camera);
-    expectNear(applied(*camera.inertialToObject(), c.from), c.to, c.what);
-    expectNear(applied(*camera.inertialToObject(), {0, 0, 0}), {0, 0, 0}, c.what);
+    testing::expectNear(applied(*camera.inertialToObject(), c.from), c.to, 1e-6, c.what);
+    testing::expectNear(applied(*camera.inertialToObject(), {0, 0, 0}), {0, 0, 0}, 1e-6, c.what);
   }
 }
 
@@ -155,26 +142,18 @@ using testing::Box;
 using testing::Frame;
 using testing::Rgba;
 
-// The frustum colours come from the user defaults: blue, and green when
-// selected, for the life of this object.
-struct FrustumColours {
-  FrustumColours()
-      : previous(UserDefaults::setStandardUserDefaults(
-            std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>()))) {
-    auto& defaults = UserDefaults::standardUserDefaults();
-    setColorForDefaultsKey(defaults, *Color::colorWithRGBA(0, 0, 1, 1), kFrustumColorKey);
-    setColorForDefaultsKey(defaults, *Color::colorWithRGBA(0, 1, 0, 1), kSelectedFrustumColorKey);
-  }
-  ~FrustumColours() { UserDefaults::setStandardUserDefaults(std::move(previous)); }
-  std::unique_ptr<UserDefaults> previous;
-};
-
 using CameraDrawing = testing::PixelTest;
 constexpr Rgba kBlue{0, 0, 255, 255};
 constexpr Rgba kGreen{0, 255, 0, 255};
 
 TEST_F(CameraDrawing, TheFrustumIsDrawnInEditorFramesOnly) {
-  const FrustumColours colours;
+  // The frustum colours come from the user defaults: blue, and green when
+  // selected.
+  const testing::MemoryDefaults defaults;
+  setColorForDefaultsKey(UserDefaults::standardUserDefaults(), *Color::colorWithRGBA(0, 0, 1, 1),
+                         kFrustumColorKey);
+  setColorForDefaultsKey(UserDefaults::standardUserDefaults(), *Color::colorWithRGBA(0, 1, 0, 1),
+                         kSelectedFrustumColorKey);
   const struct {
     std::optional<bool> editor;
     bool selected;
@@ -205,12 +184,8 @@ TEST_F(CameraDrawing, TheFrustumIsDrawnInEditorFramesOnly) {
       EXPECT_EQ(frame.countDrawn(), 0);
       continue;
     }
-    const auto bounds = frame.drawnBounds();
-    ASSERT_TRUE(bounds);
-    EXPECT_NEAR(bounds->left, 100 - 40, 1);
-    EXPECT_NEAR(bounds->right, 101 + 40, 1);
-    EXPECT_NEAR(bounds->top, 50 - 20, 1);
-    EXPECT_NEAR(bounds->bottom, 51 + 20, 1);
+    EXPECT_TRUE(
+        testing::boundsNear(frame.drawnBounds(), {100 - 40, 50 - 20, 101 + 40, 51 + 20}, 1));
     EXPECT_GT(frame.count(c.frustum), 100);
     // The body only for the selected camera, in white.
     EXPECT_EQ(frame.count(testing::kWhite) > 0, c.selected);

@@ -4,12 +4,12 @@
 #include <gtest/gtest.h>
 
 #include <array>
-#include <cmath>
 #include <limits>
 #include <string>
 
 #include "render/opengl_scene.h"
 #include "scene/archive_helpers.h"
+#include "support/near.h"
 #include "support/pixel_harness.h"
 
 namespace cloudreel {
@@ -18,12 +18,7 @@ namespace {
 // 300 × 100 pixels: the ball's centre is (150, 50), its radius 50.
 const OpenGLScene kScene = OpenGLScene::initWithWidthHeightFieldOfView(300, 100, 30);
 
-void expectTurn(const AxisAngle& actual, const AxisAngle& expected, const std::string& what) {
-  EXPECT_NEAR(actual[0], expected[0], 1e-4) << what << ": angle";
-  for (std::size_t i = 1; i < 4; ++i) {
-    EXPECT_NEAR(actual[i], expected[i], 1e-6) << what << ": axis " << i;
-  }
-}
+using testing::expectNear;
 
 // A drag over the view from one pointer position to another; the drag stays
 // in progress.
@@ -51,8 +46,8 @@ TEST(RWTrackball, ADragTurnsByTheTruncatedPointerPositionsOverTheScene) {
   for (const auto& c : cases) {
     RWTrackball trackball;
     drag(trackball, c.from, c.to);
-    expectTurn(trackball.intermediate(), c.turn, c.what);
-    expectTurn(trackball.rotation(), {0, 0, 0, 0}, c.what);
+    expectNear(trackball.intermediate(), c.turn, 1e-4, c.what);
+    expectNear(trackball.rotation(), {0, 0, 0, 0}, 1e-4, c.what);
   }
 }
 
@@ -60,11 +55,11 @@ TEST(RWTrackball, EndingADragFoldsItsTurnIntoTheRotationAndMatrixReadsDegreesAsR
   RWTrackball trackball;
   drag(trackball, {200, 50}, {150, 100});
   trackball.addRotationToTrackball();
-  expectTurn(trackball.rotation(), {90, 0, 0, 1}, "one drag");
+  expectNear(trackball.rotation(), {90, 0, 0, 1}, 1e-4, "one drag");
   EXPECT_EQ(trackball.intermediate(), (AxisAngle{0, 0, 0, 0}));
   drag(trackball, {200, 50}, {150, 100});
   trackball.addRotationToTrackball();
-  expectTurn(trackball.rotation(), {180, 0, 0, 1}, "two drags");
+  expectNear(trackball.rotation(), {180, 0, 0, 1}, 1e-4, "two drags");
 
   // 180 radians about z, not π.
   const auto m = trackball.matrix()->mx();

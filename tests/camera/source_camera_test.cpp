@@ -8,7 +8,6 @@
 #include <cmath>
 #include <cstdint>
 #include <filesystem>
-#include <fstream>
 #include <string>
 #include <vector>
 
@@ -52,7 +51,6 @@ TEST(SourceCamera, ThePhotographsSizeComesFromItsHeaderAndAFailedLoadLeavesNone)
   const testing::TempDir dir;
   const std::vector<std::uint8_t> grey(640 * 480, 128);
   ASSERT_NE(stbi_write_jpg((dir / "a.jpg").c_str(), 640, 480, 1, grey.data(), 90), 0);
-  std::ofstream(dir / "notes.txt") << "not a picture";
   const struct {
     std::filesystem::path path;
     int width, height;  // 0 × 0: no photograph
@@ -62,7 +60,7 @@ TEST(SourceCamera, ThePhotographsSizeComesFromItsHeaderAndAFailedLoadLeavesNone)
       // Only the header is read, so a photograph whose pixels are damaged
       // still counts until it is drawn.
       {writeHeaderOnlyPng(dir / "cut.png", 7, 2), 7, 2},
-      {dir / "notes.txt", 0, 0},
+      {testing::writeFile(dir / "notes.txt", "not a picture"), 0, 0},
       {dir / "missing.jpg", 0, 0},
       {"", 0, 0},
   };
@@ -126,12 +124,7 @@ TEST_F(SourceCameraDrawing, ASelectedCameraShowsItsPhotographUprightAtTheEndOfIt
     EXPECT_TRUE(testing::pixelIs(frame, 50, 30, c.top, 2));
     EXPECT_TRUE(testing::pixelIs(frame, 50, 70, c.bottom, 2));
     if (c.top != testing::kBlack) {
-      const auto bounds = frame.drawnBounds();
-      ASSERT_TRUE(bounds);
-      EXPECT_NEAR(bounds->left, 10, 1);
-      EXPECT_NEAR(bounds->right, 91, 1);
-      EXPECT_NEAR(bounds->top, 15, 1);
-      EXPECT_NEAR(bounds->bottom, 86, 1);
+      EXPECT_TRUE(testing::boundsNear(frame.drawnBounds(), {10, 15, 91, 86}, 1));
     }
   }
 }

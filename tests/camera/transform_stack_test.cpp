@@ -11,16 +11,14 @@
 #include "camera/camera.h"
 #include "camera/discrete_camera_path.h"
 #include "scene/archive_helpers.h"
+#include "support/near.h"
 
 namespace cloudreel {
 namespace {
 
 using Point = std::array<double, 3>;
-
-Point applied(const AffineTransform& t, Point p) {
-  t.multiply3Vector(p);
-  return p;
-}
+using testing::applied;
+using testing::expectNear;
 
 // A path of `frames` frames, each turned by the type-11 Euler angles and
 // standing at `position`.
@@ -32,12 +30,6 @@ std::shared_ptr<DiscreteCameraPath> posedPath(int frames, const std::array<doubl
   auto path = std::make_shared<DiscreteCameraPath>(25);
   path->setPoints(std::vector<CameraPathRecord>(static_cast<std::size_t>(frames), record));
   return path;
-}
-
-void expectNear(const Point& actual, const Point& expected, const std::string& what) {
-  for (std::size_t i = 0; i < 3; ++i) {
-    EXPECT_NEAR(actual[i], expected[i], 1e-9) << what << ", component " << i;
-  }
 }
 
 TEST(TransformStack, MembersApplyInListOrderEachKeepingWhatItsSwitchesSay) {
@@ -77,7 +69,7 @@ TEST(TransformStack, MembersApplyInListOrderEachKeepingWhatItsSwitchesSay) {
     c.adjust(*stack.transformations()[0]);
     const auto camera = stack.cameraInObjectSpaceForFrame(0);
     ASSERT_NE(camera, nullptr);
-    expectNear(applied(*camera->inertialToObject(), {1, 0, 0}), c.x, c.what);
+    expectNear(applied(*camera->inertialToObject(), {1, 0, 0}), c.x, 1e-9, c.what);
   }
 }
 
@@ -93,9 +85,9 @@ TEST(TransformStack, RunsAsLongAsItsLongestPathAndShorterOnesFallSilent) {
   // Frame 4 is past the first path's end: it contributes nothing there. Time
   // 1 asks for frame 7, past every path.
   expectNear(applied(*stack.cameraInObjectSpaceForFrame(4)->inertialToObject(), {0, 0, 0}),
-             {0, 1, 1}, "frame 4");
+             {0, 1, 1}, 1e-9, "frame 4");
   expectNear(applied(*stack.cameraInObjectSpaceForTime(1.0f)->inertialToObject(), {0, 0, 0}),
-             {0, 0, 0}, "time 1");
+             {0, 0, 0}, 1e-9, "time 1");
   // A stack that reaches itself through a member counts as empty there.
   auto looped = std::make_shared<TransformStack>();
   looped->addTransformation(TransformStackMember::initWithCameraPath(looped));
@@ -151,7 +143,7 @@ TEST(TransformStack, MembersComeBackFromTheArchiveWithoutTheirNames) {
                                back.enableRotation(), back.enableTranslation()}),
             std::vector<bool>({true, false, false, true}));
   expectNear(applied(*decoded->cameraInObjectSpaceForFrame(0)->inertialToObject(), {0, 0, 0}),
-             {0.5, 1, 1.5}, "decoded");
+             {0.5, 1, 1.5}, 1e-9, "decoded");
   // An older member without the values reads them as NO and 0.
   const auto bare =
       testing::decodeFrom<TransformStackMember>("TransformStackMember", [](KeyedArchiver&) {});

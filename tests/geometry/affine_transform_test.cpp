@@ -3,29 +3,24 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <numbers>
 
 #include "geometry/geometry_classes.h"
 #include "platform/class_registry.h"
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
 #include "platform/log.h"
+#include "support/near.h"
 
 namespace cloudreel {
 namespace {
 
-constexpr double kPi = 3.141592653589793;
+constexpr double kPi = std::numbers::pi;
 using P = std::array<double, 3>;
+using testing::applied;
+using testing::expectNear;
 
-P apply(const AffineTransform& t, P p) {
-  t.multiply3Vector(p);
-  return p;
-}
-
-void expectNear(const P& a, const P& b) {
-  for (int i = 0; i < 3; ++i) {
-    EXPECT_NEAR(a[i], b[i], 1e-12) << "component " << i;
-  }
-}
+P translationOf(const AffineTransform& t) { return {t.mx()[12], t.mx()[13], t.mx()[14]}; }
 
 TEST(Vector3, NormalizeAndEqualityTolerances) {
   struct NormalizeCase {
@@ -36,9 +31,7 @@ TEST(Vector3, NormalizeAndEqualityTolerances) {
                         {{3, 0, 4}, {0.6, 0, 0.8}}}) {
     Vector3 v(c.in);
     v.normalize();
-    EXPECT_NEAR(v.x(), c.out[0], 1e-7);
-    EXPECT_NEAR(v.y(), c.out[1], 1e-7);
-    EXPECT_NEAR(v.z(), c.out[2], 1e-7);
+    expectNear(P{v.x(), v.y(), v.z()}, c.out, 1e-7);
   }
   struct EqualCase {
     P a, b;
@@ -89,10 +82,10 @@ TEST(AffineTransform, EulerRotationsFollowTheirAxisOrder) {
   AffineTransform t;
   t.setTranslation({4, 5, 6});
   t.setEulerRotationType({0, 0, 90}, 11);
-  expectNear(apply(t, {1, 0, 0}), {0, 0, -1});
-  expectNear({t.mx()[12], t.mx()[13], t.mx()[14]}, {0, 0, 0});  // translation reset
+  expectNear(applied(t, {1, 0, 0}), {0, 0, -1});
+  expectNear(translationOf(t), {0, 0, 0});  // translation reset
   t.setEulerRotationType({90, 0, 0}, 11);
-  expectNear(apply(t, {1, 0, 0}), {0, 1, 0});
+  expectNear(applied(t, {1, 0, 0}), {0, 1, 0});
 
   const auto before = t.mx();
   t.setEulerRotationType({10, 20, 30}, 5);  // unknown type: unchanged
@@ -110,29 +103,29 @@ TEST(AffineTransform, QuaternionAndAxisAngleWriteOnlyTheRotationBlock) {
   t.setTranslation({7, 8, 9});
   const double h = std::sqrt(0.5);
   t.setQuaternionRotation({h, 0, 0, h});  // 90° about z
-  expectNear(apply(t, {1, 0, 0}), {7, 9, 9});
+  expectNear(applied(t, {1, 0, 0}), {7, 9, 9});
   // Element 2 keeps its 2·q0·q1 term.
   t.setQuaternionRotation({0.5, 0.5, 0.5, 0.5});
   EXPECT_DOUBLE_EQ(t.mx()[2], 2 * 0.5 * 0.5 + 2 * 0.5 * 0.5);
 
   AffineTransform r;
   r.setAxisAngleRotation({kPi / 2, 0, 0, 1});
-  expectNear(apply(r, {1, 0, 0}), {0, 1, 0});
-  expectNear({r.basisVectorX()->x(), r.basisVectorX()->y(), r.basisVectorX()->z()}, {0, -1, 0});
-  expectNear({r.columnZ()->x(), r.columnZ()->y(), r.columnZ()->z()}, {0, 0, 1});
+  expectNear(applied(r, {1, 0, 0}), {0, 1, 0});
+  expectNear(P{r.basisVectorX()->x(), r.basisVectorX()->y(), r.basisVectorX()->z()}, {0, -1, 0});
+  expectNear(P{r.columnZ()->x(), r.columnZ()->y(), r.columnZ()->z()}, {0, 0, 1});
 }
 
 TEST(AffineTransform, MultiplicationAppliesTheArgumentAfterTheReceiver) {
   AffineTransform t;
   t.setAxisAngleRotation({kPi / 2, 0, 0, 1});
   t.multiplyByTranslation({1, 2, 3});
-  expectNear(apply(t, {1, 0, 0}), {1, 3, 3});  // rotated first, then moved
-  expectNear({t.mx()[12], t.mx()[13], t.mx()[14]}, {1, 2, 3});
+  expectNear(applied(t, {1, 0, 0}), {1, 3, 3});  // rotated first, then moved
+  expectNear(translationOf(t), {1, 2, 3});
 
   AffineTransform moved;
   moved.setTranslation({1, 0, 0});
   moved.multiplyByAxisAngleRotation({kPi / 2, 0, 0, 1});  // turns the translation too
-  expectNear({moved.mx()[12], moved.mx()[13], moved.mx()[14]}, {0, 1, 0});
+  expectNear(translationOf(moved), {0, 1, 0});
 
   AffineTransform scaled;
   scaled.setTranslation({1, 0, 0});
@@ -146,7 +139,7 @@ TEST(AffineTransform, MultiplicationAppliesTheArgumentAfterTheReceiver) {
   AffineTransform square;
   square.setTranslation({1, 1, 1});
   square.multiplyByMatrix(square);
-  expectNear({square.mx()[12], square.mx()[13], square.mx()[14]}, {2, 2, 2});
+  expectNear(translationOf(square), {2, 2, 2});
 
   AffineTransform mirror;
   mirror.setToScale(-2);  // determinant -8

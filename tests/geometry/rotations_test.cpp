@@ -4,20 +4,14 @@
 
 #include <cmath>
 
-#include "geometry/affine_transform.h"
 #include "geometry/trackball.h"
+#include "support/near.h"
 
 namespace cloudreel {
 namespace {
 
+using testing::expectNear;
 const double kHalf = std::sqrt(0.5);
-
-template <std::size_t N>
-void expectNear(const std::array<double, N>& a, const std::array<double, N>& b, double tol = 1e-9) {
-  for (std::size_t i = 0; i < N; ++i) {
-    EXPECT_NEAR(a[i], b[i], tol) << "element " << i;
-  }
-}
 
 TEST(Rotations, SlerpTakesTheShorterArcAndBlendsLinearlyWhenClose) {
   Quaternion out;
@@ -67,7 +61,7 @@ TEST(Rotations, ConversionsAndTheirSpecialCases) {
   EXPECT_DOUBLE_EQ(m[6], block.mx()[9]);
 }
 
-TEST(Trackball, DragsTurnFromTheStartAndAccumulate) {
+TEST(Trackball, DragsTurnFromTheStart) {
   // A 200×100 view: radius 50, centre (100, 50).
   trackballBegin(100, 50, 0, 0, 200, 100);
   EXPECT_EQ(trackballDragState().radius, 50.0f);
@@ -81,12 +75,7 @@ TEST(Trackball, DragsTurnFromTheStartAndAccumulate) {
   expectNear(roll, {90, 0, 1, 0}, 1e-5);
   trackballRoll(125, 50, roll);  // measured from the start again, not the last roll
   EXPECT_NEAR(roll[0], 30.0, 1e-4);
-
-  AxisAngle accumulated = {0, 0, 0, 0};
-  trackballAddRotation({90, 0, 0, 1}, accumulated);
-  expectNear(accumulated, {90, 0, 0, 1});
-  trackballAddRotation({90, 0, 0, 1}, accumulated);
-  expectNear(accumulated, {180, 0, 0, 1});
+  // Adding turns together is checked through the camera trackball.
 }
 
 }  // namespace

@@ -5,7 +5,6 @@
 
 #include <cstdint>
 #include <filesystem>
-#include <fstream>
 #include <string>
 #include <vector>
 
@@ -28,11 +27,7 @@ std::string points(int count) {
   return text;
 }
 
-std::filesystem::path write(const std::filesystem::path& path, const std::string& text) {
-  std::filesystem::create_directories(path.parent_path());
-  std::ofstream(path, std::ios::binary) << text;
-  return path;
-}
+using testing::writeFile;
 
 std::vector<std::shared_ptr<Camera>> fieldCameras(const BundlerFile& layer) {
   const auto field = layer.childLayerCount() > 0
@@ -47,10 +42,10 @@ TEST(BundlerFile, AReconstructionGivesItsPointsAndItsCamerasWithTheirPhotographs
   const std::vector<std::uint8_t> grey(20 * 10, 99);
   ASSERT_NE(stbi_write_jpg((root / "images/a.jpg").c_str(), 20, 10, 1, grey.data(), 90), 0);
   // One line for three cameras: the others get no photograph.
-  write(root / "list.txt", "images/a.jpg 0 1234.5\n");
-  const auto url = write(root / "bundle/bundle.out",
-                         "# Bundle file v0.3\n3 300\n" + kCamera + kCamera + kCamera +
-                             "-4 9 2.5\n300 -1 128\n2 0 5 1.5 2.5 1 7 0.1 0.2\n" + points(299));
+  writeFile(root / "list.txt", "images/a.jpg 0 1234.5\n");
+  const auto url = writeFile(root / "bundle/bundle.out",
+                             "# Bundle file v0.3\n3 300\n" + kCamera + kCamera + kCamera +
+                                 "-4 9 2.5\n300 -1 128\n2 0 5 1.5 2.5 1 7 0.1 0.2\n" + points(299));
 
   const auto layer = BundlerFile::initWithURLShouldLink(url, false);
   ASSERT_TRUE(layer);
@@ -101,7 +96,7 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
     SCOPED_TRACE(c.name);
     const auto url = dir / c.name;
     if (c.name != "missing") {
-      write(url, c.text);
+      writeFile(url, c.text);
     }
     BundlerFile layer;
     Error error;
@@ -120,7 +115,7 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
 
 TEST(BundlerFile, ALinkedLayerIsReadFromItsFileAgainWhenDecoded) {
   const testing::TempDir dir;
-  const auto url = write(dir / "b/bundle.out", "#\n1 5\n" + kCamera + points(5));
+  const auto url = writeFile(dir / "b/bundle.out", "#\n1 5\n" + kCamera + points(5));
   for (const bool linked : {false, true}) {
     SCOPED_TRACE(linked ? "linked" : "inline");
     const auto layer = BundlerFile::initWithURLShouldLink(url, linked);

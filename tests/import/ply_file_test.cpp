@@ -2,9 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cmath>
-#include <fstream>
 #include <limits>
 #include <string>
 #include <tuple>
@@ -32,8 +30,7 @@ std::filesystem::path writePly(const std::filesystem::path& path, const std::str
       ply.back().properties.push_back({p.substr(0, p.find(' ')), p.substr(p.find(' ') + 1)});
     }
   }
-  std::ofstream(path, std::ios::binary) << testing::plyText(ply, format);
-  return path;
+  return testing::writeFile(path, testing::plyText(ply, format));
 }
 
 using Record = std::tuple<float, float, float, int, int, int, int>;  // x y z r g b luck
@@ -145,7 +142,7 @@ TEST(PLYFile, AnswersNullWhenTheFileCannotBeRead) {
       "x\nend_header\n";
   for (const std::string& text :
        {std::string("garbage\n"), header + "1 234\n", header + "1 2 x\n", huge}) {
-    std::ofstream(dir / "bad.ply", std::ios::binary) << text;
+    testing::writeFile(dir / "bad.ply", text);
     if (text == huge) std::filesystem::resize_file(dir / "bad.ply", huge.size() + 4294967297u);
     EXPECT_FALSE(PLYFile::initWithURLDownsample(dir / "bad.ply", 1)) << text;
   }

@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
-#include <fstream>
 #include <limits>
 #include <random>
 #include <string>
@@ -80,15 +79,11 @@ Outcome readFile(const std::filesystem::path& path, const std::string& skipped =
   return readPly(ply_open(path.c_str(), recordError, 0, &outcome), outcome, skipped);
 }
 
-Outcome readBytes(const std::string& bytes) {
-  Outcome outcome;
-  return readPly(
-      ply_open_from_memory(bytes.data(), bytes.size(), "memory", recordError, 0, &outcome),
-      outcome);
-}
-
-void writeFile(const std::filesystem::path& path, const std::string& bytes) {
-  std::ofstream(path, std::ios::binary) << bytes;
+// Writes `bytes` as the one PLY file a test reads at a time. Reading the
+// same bytes from memory is compared with this by the fuzz target.
+std::filesystem::path plyFile(const std::string& bytes) {
+  static const testing::TempDir dir;
+  return testing::writeFile(dir / "test.ply", bytes);
 }
 
 // The calls a read of every property makes, by the list protocol.
@@ -122,14 +117,7 @@ const std::vector<std::string> kFormats = {"ascii", "binary_little_endian", "bin
 std::vector<PlyElement> sampleScene(int vertices) {
   std::mt19937 random(7);
   std::uniform_real_distribution<float> coordinate(-1000.0f, 1000.0f);
-  PlyElement vertex{"vertex",
-                    {{"float", "x"},
-                     {"float", "y"},
-                     {"float", "z"},
-                     {"uchar", "red"},
-                     {"uchar", "green"},
-                     {"uchar", "blue"}},
-                    {}};
+  PlyElement vertex{"vertex", testing::kPlyXyzRgb, {}};
   for (int i = 0; i < vertices; ++i) {
     vertex.instances.push_back({coordinate(random), coordinate(random), coordinate(random),
                                 double(i % 256), double(random() % 256), 255});
@@ -142,21 +130,15 @@ std::vector<PlyElement> sampleScene(int vertices) {
 }
 
 TEST(PlyReader, ReadsTheSameScenesInEveryFormatWithListsReadOrSkipped) {
-  testing::TempDir dir;
-  auto scene = sampleScene(20000);
+  const auto scene = sampleScene(20000);
   for (const auto& format : kFormats) {
-    writeFile(dir / format, plyText(scene, format));
+    const auto path = plyFile(plyText(scene, format));
     for (std::string skipped : {"", "face"}) {
       SCOPED_TRACE(format + " skipping '" + skipped + "'");
-      Outcome outcome = readFile(dir / format, skipped);
-      EXPECT_TRUE(outcome.ok);
-      EXPECT_TRUE(outcome.errors.empty());
+      const Outcome outcome = readFile(path, skipped);
+      EXPECT_TRUE(outcome.ok && outcome.errors.empty());
       EXPECT_TRUE(outcome.calls == expectedCalls(scene, skipped));
     }
-    // Held in memory, the file reads the same (the fuzz target compares the
-    // two ways in on damaged files).
-    const Outcome inMemory = readBytes(plyText(scene, format));
-    EXPECT_TRUE(inMemory.ok && inMemory.calls == expectedCalls(scene, "")) << format;
   }
 }
 
@@ -180,14 +162,12 @@ TEST(PlyReader, ReadsEveryScalarTypeUnderBothNames) {
     sample.properties.push_back({row.name, std::string("p_") + row.name});
     sample.instances[0].push_back(row.value);
   }
-  testing::TempDir dir;
   for (const auto& format : kFormats) {
     SCOPED_TRACE(format);
-    writeFile(dir / format, plyText({sample}, format));
-    Outcome outcome = readFile(dir / format);
+    const auto path = plyFile(plyText({sample}, format));
+    Outcome outcome = readFile(path);
     EXPECT_TRUE(outcome.calls == expectedCalls({sample}, ""));
-    Outcome unused;
-    PlyHandle ply(ply_open((dir / format).c_str(), recordError, 0, &unused));
+    PlyHandle ply(ply_open(path.c_str(), recordError, 0, &outcome));
     ASSERT_TRUE(ply_read_header(ply.get()));
     p_ply_property property = nullptr;
     for (const Row& row : rows) {
@@ -206,16 +186,15 @@ TEST(PlyReader, ReadsHeaderDetailsAndCrLfLineEnds) {
   std::vector<PlyElement> scene = {{"vertex", {{"float", "x"}, {"int", "id"}}, {{1.5, 7}, {-2, 8}}},
                                    {"camera", {{"float", "fov"}}, {}},
                                    {"face", {{"int", "vertex_indices", "uchar"}}, {{2, 0, 1}}}};
-  testing::TempDir dir;
   for (const char* format : {"ascii", "binary_big_endian"}) {
     SCOPED_TRACE(format);
-    writeFile(dir / format,
-              plyText(scene, format, "\r\n", "comment made by hand\r\nobj_info x\r\ncomment\r\n"));
-    Outcome outcome = readFile(dir / format);
+    const auto path = plyFile(
+        plyText(scene, format, "\r\n", "comment made by hand\r\nobj_info x\r\ncomment\r\n"));
+    Outcome outcome = readFile(path);
     EXPECT_TRUE(outcome.ok);
     EXPECT_TRUE(outcome.calls == expectedCalls(scene, ""));
 
-    PlyHandle ply(ply_open((dir / format).c_str(), recordError, 0, &outcome));
+    PlyHandle ply(ply_open(path.c_str(), recordError, 0, &outcome));
     ASSERT_TRUE(ply_read_header(ply.get()));
     EXPECT_STREQ(ply_storage_mode_name(ply_get_storage_mode(ply.get())), format);
     const char* comment = ply_get_next_comment(ply.get(), nullptr);
@@ -244,21 +223,18 @@ TEST(PlyReader, ReadsAsciiValuesAsOtherWritersWriteThem) {
       {"uchar", "300", 300},
       {"int", "+7", 7},
   };
-  testing::TempDir dir;
   for (const Case& c : cases) {
-    writeFile(dir / "value.ply", std::string("ply\nformat ascii 1.0\nelement v 1\nproperty ") +
-                                     c.type + " x\nend_header\n" + c.text + "\r\n");
-    Outcome outcome = readFile(dir / "value.ply");
+    const Outcome outcome =
+        readFile(plyFile(std::string("ply\nformat ascii 1.0\nelement v 1\n") + "property " +
+                         c.type + " x\nend_header\n" + c.text + "\r\n"));
     ASSERT_EQ(outcome.calls.size(), 1u) << c.text;
     EXPECT_EQ(outcome.calls[0].value, c.value) << c.text;
   }
 }
 
 TEST(PlyReader, StopsWhenACallbackAnswersZero) {
-  testing::TempDir dir;
   for (const auto& format : kFormats) {
-    writeFile(dir / format, plyText(sampleScene(10), format));
-    Outcome outcome = readFile(dir / format, "", 3);
+    const Outcome outcome = readFile(plyFile(plyText(sampleScene(10), format)), "", 3);
     EXPECT_FALSE(outcome.ok) << format;
     EXPECT_EQ(outcome.calls.size(), 3u) << format;
     ASSERT_EQ(outcome.errors.size(), 1u) << format;
@@ -317,15 +293,13 @@ TEST(PlyReader, ReportsBrokenFilesThroughTheErrorCallback) {
       {"a bad ASCII value", "ply\nformat ascii 1.0\n" + vertexX + "1.5 abc\n", "bad value"},
       {"a fraction for an int", "ply\nformat ascii 1.0\n" + faces + "1.5 1\n", "bad value"},
   };
-  testing::TempDir dir;
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
-    writeFile(dir / "broken.ply", c.bytes);
-    Outcome outcome = readFile(dir / "broken.ply");
+    const auto path = plyFile(c.bytes);
+    const Outcome outcome = readFile(path);
     EXPECT_FALSE(outcome.ok);
     ASSERT_EQ(outcome.errors.size(), 1u);
-    EXPECT_EQ(outcome.errors[0].rfind((dir / "broken.ply").string() + ": ", 0), 0u)
-        << outcome.errors[0];
+    EXPECT_EQ(outcome.errors[0].rfind(path.string() + ": ", 0), 0u) << outcome.errors[0];
     EXPECT_NE(outcome.errors[0].find(c.message), std::string::npos) << outcome.errors[0];
   }
 }

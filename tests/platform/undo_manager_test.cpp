@@ -2,87 +2,59 @@
 
 #include <gtest/gtest.h>
 
-#include "platform/object.h"
+#include <string>
+#include <vector>
+
 #include "platform/run_loop.h"
 
 namespace cloudreel {
 namespace {
 
-class Shape : public Object {
- public:
-  const PropertyTable& properties() const override {
-    static const PropertyTable table(&Object::objectProperties(),
-                                     {property<Shape>("scale", &Shape::scale, &Shape::setScale),
-                                      property<Shape>("name", &Shape::name, &Shape::setName)});
-    return table;
+// A value whose every set registers setting the old value back, as the
+// document's property observers do, so that undoing a set registers its redo.
+struct UndoableValue {
+  UndoManager& undo;
+  int value = 0;
+  void set(int v, const std::string& actionName) {
+    undo.registerUndoWithTarget(this, [this, old = value, actionName] { set(old, actionName); });
+    undo.setActionName(actionName);
+    value = v;
   }
-  double scale() const { return scale_; }
-  void setScale(double v) { changeValueForKey("scale", scale_, v); }
-  std::string name() const { return name_; }
-  void setName(std::string v) { changeValueForKey("name", name_, std::move(v)); }
-
- private:
-  double scale_ = 1.0;
-  std::string name_ = "shape";
 };
 
-// The document's way of making property edits undoable: observe with the
-// action name as context, and register "set the old value back".
-class Editor : public Observer {
- public:
-  explicit Editor(UndoManager& undo) : undo_(undo) {}
-  void observeValueForKeyPathOfObjectChangeContext(std::string_view keyPath, Object& object,
-                                                   const Change& change,
-                                                   std::string_view context) override {
-    const ObjectPtr target = object.shared_from_this();
-    const Value old = change.oldValue.value_or(Value{});
-    undo_.registerUndoWithTarget(
-        this, [key = std::string(keyPath), target, old] { target->setValueForKeyPath(old, key); });
-    undo_.setActionName(std::string(context));
-  }
-
- private:
-  UndoManager& undo_;
-};
-
-TEST(UndoManager, ObservedPropertyChangesUndoAndRedoWithTheirActionNames) {
+TEST(UndoManager, StepsUndoAndRedoWithTheirActionNamesUntilANewEditClearsTheRedos) {
   UndoManager undo;
-  Editor editor(undo);
-  auto shape = std::make_shared<Shape>();
-  shape->addObserver(editor, "scale", ObservingOptions::Old, "Scale");
-  shape->addObserver(editor, "name", ObservingOptions::Old, "Change Name");
-
-  shape->setScale(2.0);
+  UndoableValue scale{undo}, name{undo};
+  scale.set(2, "Scale");
   undo.closeEventGroup();
-  shape->setName("ball");
+  name.set(5, "Change Name");
   undo.closeEventGroup();
   EXPECT_EQ(undo.undoActionName(), "Change Name");
 
   undo.undo();
-  EXPECT_EQ(shape->name(), "shape");
+  EXPECT_EQ(name.value, 0);
   EXPECT_EQ(undo.undoActionName(), "Scale");
   EXPECT_EQ(undo.redoActionName(), "Change Name");
-
   undo.undo();
-  EXPECT_EQ(shape->scale(), 1.0);
+  EXPECT_EQ(scale.value, 0);
   EXPECT_FALSE(undo.canUndo());
   EXPECT_EQ(undo.redoActionName(), "Scale");
 
   undo.redo();
-  EXPECT_EQ(shape->scale(), 2.0);
+  EXPECT_EQ(scale.value, 2);
   EXPECT_EQ(undo.undoActionName(), "Scale");
   undo.redo();
-  EXPECT_EQ(shape->name(), "ball");
+  EXPECT_EQ(name.value, 5);
   EXPECT_FALSE(undo.canRedo());
 
   // The round trip can go on: undoing again still works from the redone state.
   undo.undo();
   undo.undo();
-  EXPECT_EQ(shape->scale(), 1.0);
-  EXPECT_EQ(shape->name(), "shape");
+  EXPECT_EQ(scale.value, 0);
+  EXPECT_EQ(name.value, 0);
 
   // A fresh edit clears what could have been redone.
-  shape->setScale(3.0);
+  scale.set(3, "Scale");
   EXPECT_FALSE(undo.canRedo());
 }
 

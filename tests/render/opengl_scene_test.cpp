@@ -9,6 +9,7 @@
 #include <limits>
 
 #include "camera/camera.h"
+#include "support/near.h"
 #include "support/pixel_harness.h"
 
 namespace cloudreel {
@@ -61,14 +62,10 @@ TEST_F(OpenGLSceneTest, TheCamerasFieldOfViewSpansTheShorterSideBetweenTheCamera
         OpenGLScene::initWithWidthHeightFieldOfViewZNearZFar(c.width, c.height, 60, 1, 30);
     EXPECT_EQ(scene.aspectRatio(), c.aspect);
     EXPECT_EQ(scene.smallerDimension(), c.smaller);
-    const Matrix m = projectionFor(scene, *camera);
-    EXPECT_NEAR(m[0], c.xScale, 1e-6);
-    EXPECT_NEAR(m[5], c.yScale, 1e-6);
-    EXPECT_EQ(m[8], 0.0f);
-    EXPECT_EQ(m[9], 0.0f);
-    EXPECT_NEAR(m[10], -52.0f / 48.0f, 1e-6);   // -(far + near) / (far - near)
-    EXPECT_NEAR(m[14], -200.0f / 48.0f, 1e-5);  // -2 far near / (far - near)
-    EXPECT_EQ(m[11], -1.0f);
+    // Depth: -(far + near) / (far - near) and -2 far near / (far - near).
+    testing::expectNear(
+        projectionFor(scene, *camera),
+        {c.xScale, 0, 0, 0, 0, c.yScale, 0, 0, 0, 0, -52.0f / 48, -1, 0, 0, -200.0f / 48, 0}, 1e-5);
   }
 
   // Without height the window is infinitely wide: no horizontal scale, a NaN

@@ -4,9 +4,8 @@
 #include <epoxy/gl.h>
 #include <gtest/gtest.h>
 
-#include <cmath>
+#include <algorithm>
 #include <cstring>
-#include <fstream>
 #include <limits>
 #include <vector>
 
@@ -197,33 +196,31 @@ TEST_F(PointDrawingTest, MeshesIgnoreLuckUnlessPointsOnlyAndSpheresWinOverTheMes
   EXPECT_LT(spheres, 3 * 40);
 }
 
-// A point file of records with normals: 28 bytes each.
-void writeLitPointFile(const std::filesystem::path& path,
-                       const std::vector<std::array<float, 6>>& points) {
-  std::vector<std::uint8_t> bytes(88);
+// A point file of red points with normals: records of 28 bytes.
+std::filesystem::path writeLitPointFile(const std::filesystem::path& path,
+                                        const std::vector<std::array<float, 6>>& points) {
+  std::string bytes(88, '\0');
   std::memcpy(bytes.data(), "RWBP", 4);
   const auto n = static_cast<std::uint32_t>(points.size());
   std::memcpy(bytes.data() + 12, &n, 4);
   bytes[24] = 1;
   for (const auto& p : points) {
-    std::uint8_t record[28] = {};
+    char record[28] = {};
     std::memcpy(record, p.data(), 24);
-    record[24] = 200;  // red
-    bytes.insert(bytes.end(), record, record + 28);
+    record[24] = char(200);
+    bytes.append(record, 28);
   }
-  std::ofstream(path, std::ios::binary)
-      .write(reinterpret_cast<const char*>(bytes.data()),
-             static_cast<std::streamsize>(bytes.size()));
+  return testing::writeFile(path, bytes);
 }
 
 TEST_F(PointDrawingTest, PointsWithNormalsAreLitInTheirOwnColour) {
   testing::TempDir dir;
   const auto [x0, y0] = centreOf(10, 10);
   const auto [x1, y1] = centreOf(20, 20);
-  writeLitPointFile(dir / "lit.rwb", {{x0, y0, 0, 0, 0, 3}, {x1, y1, 0, 0, 0, -1}});
   PointLayer layer;
   Error error;
-  ASSERT_FALSE(layer.loadPointsFromURLError(dir / "lit.rwb", &error));
+  ASSERT_FALSE(layer.loadPointsFromURLError(
+      writeLitPointFile(dir / "lit.rwb", {{x0, y0, 0, 0, 0, 3}, {x1, y1, 0, 0, 0, -1}}), &error));
   layer.setPointSize(1.0f);
   const Frame frame = render(kSize, kSize, [&] {
     glEnable(GL_LIGHT0);  // white, from +z

@@ -2,10 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "platform/class_registry.h"
-#include "platform/keyed_archiver.h"
-#include "platform/keyed_unarchiver.h"
-#include "scene/core_classes.h"
+#include "scene/archive_helpers.h"
 #include "scene/layer.h"
 #include "scene/my_document.h"
 
@@ -97,41 +94,28 @@ TEST(TransformUndo, CommittingAnEditIsOneStepBackToThePlacementBeforeIt) {
   EXPECT_EQ(scene.undo().undoActionName(), "Scale");
 }
 
-TEST(TransformUndo, DecodedTransformsAreNotObservedUntilReplaced) {
-  registerCoreClasses(ClassRegistry::shared());
+// A decoded layer and a copy are added to the document without their
+// transforms observed: their edits are not undoable until the transforms are
+// replaced.
+TEST(TransformUndo, DecodedAndCopiedTransformsAreNotObservedUntilReplaced) {
   Scene scene;
-  Error error;
-  auto decoded = std::dynamic_pointer_cast<Layer>(KeyedUnarchiver::unarchiveObjectWithData(
-      KeyedArchiver::archivedDataWithRootObject(std::make_shared<Layer>()), &error));
-  ASSERT_TRUE(decoded) << error.message;
-  scene.document.addLayer(decoded);
-  scene.endEvent();
-  scene.undo().removeAllActions();
+  for (const auto& layer : {testing::roundTrip(std::make_shared<Layer>()), copyOf(*scene.layer)}) {
+    ASSERT_TRUE(layer);
+    scene.document.addLayer(layer);
+    scene.endEvent();
+    scene.undo().removeAllActions();
+    layer->setValueForKeyPath(2.0, "objectToWorld.scale");
+    scene.endEvent();
+    EXPECT_FALSE(scene.undo().canUndo());
 
-  decoded->setValueForKeyPath(2.0, "objectToWorld.scale");
-  scene.endEvent();
-  EXPECT_FALSE(scene.undo().canUndo());
-
-  decoded->setObjectToWorldInertialToObject(std::make_shared<AffineTransform>(),
+    layer->setObjectToWorldInertialToObject(std::make_shared<AffineTransform>(),
                                             std::make_shared<AffineTransform>());
-  scene.endEvent();
-  scene.undo().removeAllActions();
-  decoded->setValueForKeyPath(2.0, "objectToWorld.scale");
-  scene.endEvent();
-  EXPECT_EQ(scene.undo().undoActionName(), "Scale");
-  // Teardown with the document still attached is safe (the scene goes
-  // first, then the decoded layer).
-}
-
-TEST(TransformUndo, ACopyDoesNotObserveItsCopiedTransforms) {
-  Scene scene;
-  auto copy = copyOf(*scene.layer);
-  scene.document.addLayer(copy);
-  scene.endEvent();
-  scene.undo().removeAllActions();
-  copy->setValueForKeyPath(2.0, "objectToWorld.scale");
-  scene.endEvent();
-  EXPECT_FALSE(scene.undo().canUndo());
+    scene.endEvent();
+    scene.undo().removeAllActions();
+    layer->setValueForKeyPath(2.0, "objectToWorld.scale");
+    scene.endEvent();
+    EXPECT_EQ(scene.undo().undoActionName(), "Scale");
+  }
 }
 
 }  // namespace

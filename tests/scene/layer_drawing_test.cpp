@@ -1,7 +1,6 @@
 // The layer draw traversal seen in real pixels.
-#include <gtest/gtest.h>
-
 #include <epoxy/gl.h>
+#include <gtest/gtest.h>
 
 #include "camera/scene_camera.h"
 #include "platform/log.h"
@@ -41,25 +40,6 @@ class Square : public Layer {
 constexpr Rgba kGreen{0, 255, 0, 255};
 constexpr Rgba kBlue{0, 0, 255, 255};
 
-// The centre of the pixels drawn in a colour, in frame coordinates.
-std::optional<std::pair<double, double>> centreOf(const Frame& frame, Rgba colour) {
-  double sx = 0, sy = 0;
-  int n = 0;
-  for (int y = 0; y < frame.height(); ++y) {
-    for (int x = 0; x < frame.width(); ++x) {
-      if (frame.at(x, y) == colour) {
-        sx += x + 0.5;
-        sy += y + 0.5;
-        ++n;
-      }
-    }
-  }
-  if (n == 0) {
-    return std::nullopt;
-  }
-  return std::pair{sx / n, sy / n};
-}
-
 // A perspective projection with a 90° field of view and the near plane at 1.
 void perspective() {
   glMatrixMode(GL_PROJECTION);
@@ -86,10 +66,7 @@ TEST_F(LayerDrawingTest, ChildrenAreDrawnInTheParentsFrameWhenVisibleWhateverThe
   EXPECT_EQ(frame.count(testing::kRed), 100);
   EXPECT_EQ(frame.count(kGreen), 0);
   EXPECT_EQ(frame.count(kBlue), 0);
-  const auto centre = centreOf(frame, testing::kRed);
-  ASSERT_TRUE(centre);
-  EXPECT_DOUBLE_EQ(centre->first, 20.0);  // 50 - 30
-  EXPECT_DOUBLE_EQ(centre->second, 50.0);
+  EXPECT_EQ(frame.boundsOf(testing::kRed), (Box{15, 45, 25, 55}));  // centred 30 left of 50
 }
 
 TEST_F(LayerDrawingTest, ABillboardStaysInFrontOfTheViewerWhileTheWorldMoves) {
@@ -122,16 +99,11 @@ TEST_F(LayerDrawingTest, ABillboardStaysInFrontOfTheViewerWhileTheWorldMoves) {
     });
     // 1 unit at distance 5 with a 90° view: 10 of 100 pixels.
     EXPECT_EQ(frame.count(testing::kRed), 100) << c.view.position[0];
-    const auto billboardCentre = centreOf(frame, testing::kRed);
-    ASSERT_TRUE(billboardCentre);
-    EXPECT_DOUBLE_EQ(billboardCentre->first, 50.0);
-    EXPECT_DOUBLE_EQ(billboardCentre->second, 50.0);
-    const auto worldCentre = centreOf(frame, kGreen);
-    if (c.worldCentreX) {
-      ASSERT_TRUE(worldCentre);
-      EXPECT_NEAR(worldCentre->first, *c.worldCentreX, 0.5);
-    } else {
-      EXPECT_FALSE(worldCentre);
+    EXPECT_EQ(frame.boundsOf(testing::kRed), (Box{45, 45, 55, 55})) << c.view.position[0];
+    const auto square = frame.boundsOf(kGreen);
+    ASSERT_EQ(square.has_value(), c.worldCentreX.has_value());
+    if (square) {
+      EXPECT_NEAR((square->left + square->right) / 2.0, *c.worldCentreX, 0.5);
     }
   }
 }

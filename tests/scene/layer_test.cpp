@@ -2,16 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include <cmath>
-#include <functional>
 #include <limits>
 #include <tuple>
 
-#include "platform/class_registry.h"
-#include "platform/keyed_archiver.h"
-#include "platform/keyed_unarchiver.h"
 #include "scene/archive_helpers.h"
-#include "scene/core_classes.h"
 #include "scene/light_source.h"
 
 namespace cloudreel {

@@ -3,8 +3,8 @@
 #include <epoxy/gl.h>
 
 #include <algorithm>
+#include <cmath>
 #include <cstdlib>
-#include <cstring>
 #include <ostream>
 #include <string_view>
 
@@ -47,7 +47,8 @@ Rgba Frame::at(int x, int y) const {
                   << height() << " frame";
     return {};
   }
-  const std::size_t i = static_cast<std::size_t>(y) * image_.rowBytes() + static_cast<std::size_t>(x) * 4;
+  const std::size_t i =
+      static_cast<std::size_t>(y) * image_.rowBytes() + static_cast<std::size_t>(x) * 4;
   return {image_.pixels[i], image_.pixels[i + 1], image_.pixels[i + 2], image_.pixels[i + 3]};
 }
 
@@ -63,7 +64,7 @@ double Frame::depthAt(int x, int y) const {
 }
 
 int Frame::count(const std::function<bool(Rgba)>& test, std::optional<Box> region) const {
-  const Box box = region.value_or(whole());
+  const Box box = region.value_or(Box{0, 0, width(), height()});
   int n = 0;
   for (int y = std::max(box.top, 0); y < std::min(box.bottom, height()); ++y) {
     for (int x = std::max(box.left, 0); x < std::min(box.right, width()); ++x) {
@@ -82,23 +83,25 @@ int Frame::countDrawn(Rgba background, int tolerance, std::optional<Box> region)
 }
 
 std::optional<Box> Frame::drawnBounds(Rgba background, int tolerance) const {
-  std::optional<Box> bounds;
+  return bounds([&](Rgba p) { return !near(p, background, tolerance); });
+}
+
+std::optional<Box> Frame::boundsOf(Rgba colour) const {
+  return bounds([&](Rgba p) { return p == colour; });
+}
+
+std::optional<Box> Frame::bounds(const std::function<bool(Rgba)>& test) const {
+  std::optional<Box> b;
   for (int y = 0; y < height(); ++y) {
     for (int x = 0; x < width(); ++x) {
-      if (near(at(x, y), background, tolerance)) {
-        continue;
-      }
-      if (!bounds) {
-        bounds = Box{x, y, x + 1, y + 1};
-      } else {
-        bounds->left = std::min(bounds->left, x);
-        bounds->right = std::max(bounds->right, x + 1);
-        bounds->top = std::min(bounds->top, y);
-        bounds->bottom = std::max(bounds->bottom, y + 1);
+      if (test(at(x, y))) {
+        b = b ? Box{std::min(b->left, x), std::min(b->top, y), std::max(b->right, x + 1),
+                    std::max(b->bottom, y + 1)}
+              : Box{x, y, x + 1, y + 1};
       }
     }
   }
-  return bounds;
+  return b;
 }
 
 double Frame::meanDrawnBrightness(Box region, Rgba background) const {
@@ -117,11 +120,8 @@ double Frame::meanDrawnBrightness(Box region, Rgba background) const {
   return n > 0 ? sum / n : 0.0;
 }
 
+// A pixel outside the frame fails through Frame::at.
 ::testing::AssertionResult pixelIs(const Frame& frame, int x, int y, Rgba expected, int tolerance) {
-  if (x < 0 || y < 0 || x >= frame.width() || y >= frame.height()) {
-    return ::testing::AssertionFailure() << "pixel (" << x << ", " << y << ") is outside the "
-                                         << frame.width() << "×" << frame.height() << " frame";
-  }
   const Rgba actual = frame.at(x, y);
   if (near(actual, expected, tolerance)) {
     return ::testing::AssertionSuccess();
@@ -131,8 +131,21 @@ double Frame::meanDrawnBrightness(Box region, Rgba background) const {
          << ", expected " << ::testing::PrintToString(expected) << " ± " << tolerance;
 }
 
-Frame renderFrame(int width, int height, const std::function<void()>& draw,
-                  const RenderOptions& options) {
+::testing::AssertionResult boundsNear(const std::optional<Box>& bounds,
+                                      const std::array<double, 4>& expected, double tolerance) {
+  const auto off = [&](int side, std::size_t i) {
+    return std::abs(side - expected[i]) > tolerance;
+  };
+  if (!bounds || off(bounds->left, 0) || off(bounds->top, 1) || off(bounds->right, 2) ||
+      off(bounds->bottom, 3)) {
+    return ::testing::AssertionFailure()
+           << "drawn " << ::testing::PrintToString(bounds) << ", expected x " << expected[0] << ".."
+           << expected[2] << ", y " << expected[1] << ".." << expected[3] << " ± " << tolerance;
+  }
+  return ::testing::AssertionSuccess();
+}
+
+Frame renderFrame(int width, int height, const std::function<void()>& draw) {
   Error error;
   auto framebuffer = gl::Framebuffer::create(width, height, &error);
   if (!framebuffer) {
@@ -149,13 +162,10 @@ Frame renderFrame(int width, int height, const std::function<void()>& draw,
     glMatrixMode(GL_MODELVIEW);
     glPushMatrix();
     glLoadIdentity();
-    glClearColor(options.background.r / 255.0f, options.background.g / 255.0f,
-                 options.background.b / 255.0f, options.background.a / 255.0f);
+    glClearColor(0.0f, 0.0f, 0.0f, 1.0f);
     glClearDepth(1.0);
     glClear(GL_COLOR_BUFFER_BIT | GL_DEPTH_BUFFER_BIT);
-    if (options.depthTest) {
-      glEnable(GL_DEPTH_TEST);
-    }
+    glEnable(GL_DEPTH_TEST);
     draw();
     const GLenum drawError = glGetError();
     glMatrixMode(GL_PROJECTION);

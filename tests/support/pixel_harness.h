@@ -11,6 +11,7 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -51,7 +52,6 @@ class Frame {
   int width() const { return image_.width; }
   int height() const { return image_.height; }
   const gl::RgbaImage& image() const { return image_; }
-  Box whole() const { return {0, 0, width(), height()}; }
 
   Rgba at(int x, int y) const;
   // Window depth at a pixel, 0 at the near plane and 1 at the far one.
@@ -65,33 +65,35 @@ class Frame {
   // The smallest box holding every pixel that differs from `background`;
   // nothing if no pixel does.
   std::optional<Box> drawnBounds(Rgba background = kBlack, int tolerance = 0) const;
+  // The smallest box holding every pixel of exactly `colour`.
+  std::optional<Box> boundsOf(Rgba colour) const;
   // Mean of (r + g + b) / 3 over the pixels in `region` that differ from
   // `background`; 0 if none do.
   double meanDrawnBrightness(Box region, Rgba background = kBlack) const;
 
  private:
+  std::optional<Box> bounds(const std::function<bool(Rgba)>& test) const;
+
   gl::RgbaImage image_;
   gl::DepthImage depth_;
 };
 
 ::testing::AssertionResult pixelIs(const Frame& frame, int x, int y, Rgba expected,
                                    int tolerance = 0);
-
-struct RenderOptions {
-  Rgba background = kBlack;
-  // Depth test on, depth cleared to the far plane.
-  bool depthTest = true;
-};
+// Whether something was drawn, its bounds within `tolerance` of the left,
+// top, right and bottom `expected`.
+::testing::AssertionResult boundsNear(const std::optional<Box>& bounds,
+                                      const std::array<double, 4>& expected, double tolerance);
 
 // Draws into a fresh width × height framebuffer in the context current on
-// this thread and reads back colour and depth. Before `draw` runs the viewport covers the
-// frame and the projection is orthographic with one unit a pixel, the origin
-// at the frame's centre, +x right, +y up, z visible from -1000 to 1000; the
-// modelview matrix is the identity. All GL state `draw` changes is put back
-// afterwards. A failure to make the framebuffer, a GL error left by `draw`,
-// or a failed read-back is a test failure (and an empty frame).
-Frame renderFrame(int width, int height, const std::function<void()>& draw,
-                  const RenderOptions& options = {});
+// this thread and reads back colour and depth. Before `draw` runs the frame
+// is cleared to black and the far plane, the depth test is on, the viewport
+// covers the frame and the projection is orthographic with one unit a pixel,
+// the origin at the frame's centre, +x right, +y up, z visible from -1000 to
+// 1000; the modelview matrix is the identity. All GL state `draw` changes is
+// put back afterwards. A failure to make the framebuffer, a GL error left by
+// `draw`, or a failed read-back is a test failure (and an empty frame).
+Frame renderFrame(int width, int height, const std::function<void()>& draw);
 
 // True where rendering tests must run (CI=true).
 bool renderingRequired();
@@ -104,9 +106,8 @@ class PixelTest : public ::testing::Test {
   void TearDown() override;
 
   gl::EglContext& context() { return *context_; }
-  Frame render(int width, int height, const std::function<void()>& draw,
-               const RenderOptions& options = {}) {
-    return renderFrame(width, height, draw, options);
+  Frame render(int width, int height, const std::function<void()>& draw) {
+    return renderFrame(width, height, draw);
   }
 
  private:

@@ -19,6 +19,11 @@ struct PlyProperty {
   std::string lengthType = "";  // empty for a scalar
 };
 
+// A coloured point's properties: x, y, z as floats, red, green, blue as bytes.
+inline const std::vector<PlyProperty> kPlyXyzRgb = {{"float", "x"},     {"float", "y"},
+                                                    {"float", "z"},     {"uchar", "red"},
+                                                    {"uchar", "green"}, {"uchar", "blue"}};
+
 // Each instance is its values in file order; a list gives its length first.
 // Values are written as the property's type holds them, so an integer
 // type's value must lie in its range.

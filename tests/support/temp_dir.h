@@ -1,8 +1,11 @@
 #pragma once
 // A fresh folder under the system's temporary directory, removed with
-// everything in it when the object goes.
+// everything in it when the object goes, and whole-file reads and writes for
+// the files tests put there.
 
 #include <filesystem>
+#include <string>
+#include <string_view>
 
 namespace cloudreel::testing {
 
@@ -19,5 +22,11 @@ class TempDir {
  private:
   std::filesystem::path path_;
 };
+
+// Replaces the file at `path` (making its folder) with `bytes`; answers the
+// path.
+std::filesystem::path writeFile(const std::filesystem::path& path, std::string_view bytes);
+// The file's bytes; empty when it cannot be read.
+std::string readFile(const std::filesystem::path& path);
 
 }  // namespace cloudreel::testing

@@ -49,11 +49,14 @@ TEST_F(EglContextTest, BothHeadlessPlatformsGiveACompatibilityContextThatDraws) 
   }
 }
 
-TEST_F(EglContextTest, SharedContextsShareADisplayListAndIndependentOnesDoNot) {
+// A framebuffer, unlike a display list, is not shared: it is read only in
+// the context that made it.
+TEST_F(EglContextTest, SharedContextsShareDisplayListsButNotFramebuffers) {
   DisplayList list;
   ASSERT_TRUE(list.compile(drawRedSquare));
-
   Error error;
+  auto framebuffer = Framebuffer::create(8, 8, &error);
+  ASSERT_TRUE(framebuffer) << error.message;
   std::unique_ptr<GLContext> shared = context().createSharedContext(&error);
   ASSERT_TRUE(shared) << error.message;
   std::unique_ptr<EglContext> independent = EglContext::createHeadless(&error);
@@ -67,6 +70,10 @@ TEST_F(EglContextTest, SharedContextsShareADisplayListAndIndependentOnesDoNot) {
     EXPECT_TRUE(list.isUsable());
     const Frame frame = renderFrame(40, 40, [&] { list.call(); });
     EXPECT_EQ(frame.count(kRed), 20 * 20);
+    RgbaImage image;
+    EXPECT_FALSE(framebuffer->readColor(image, &error));
+    EXPECT_EQ(error.code, static_cast<int>(GLErrorCode::NoCurrentContext));
+    EXPECT_TRUE(image.pixels.empty());
   }
   EXPECT_TRUE(context().isCurrent()) << "the guard puts the previous context back";
   {
@@ -156,20 +163,6 @@ TEST_F(EglContextTest, OwnersThatOutliveTheirContextsReleaseNothing) {
   const GLuint name = list.name();
   list.invalidate();
   EXPECT_FALSE(glIsList(name));
-}
-
-TEST_F(EglContextTest, AFramebufferIsReadOnlyInTheContextThatMadeIt) {
-  Error error;
-  auto framebuffer = Framebuffer::create(8, 8, &error);
-  ASSERT_TRUE(framebuffer) << error.message;
-  std::unique_ptr<GLContext> shared = context().createSharedContext(&error);
-  ASSERT_TRUE(shared) << error.message;
-  const CurrentContext current(*shared, &error);
-  ASSERT_TRUE(current) << error.message;
-  RgbaImage image;
-  EXPECT_FALSE(framebuffer->readColor(image, &error));
-  EXPECT_EQ(error.code, static_cast<int>(GLErrorCode::NoCurrentContext));
-  EXPECT_TRUE(image.pixels.empty());
 }
 
 }  // namespace

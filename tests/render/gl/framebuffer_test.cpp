@@ -3,8 +3,6 @@
 #include <epoxy/gl.h>
 #include <gtest/gtest.h>
 
-#include <numeric>
-
 #include "render/gl/gl_error.h"
 #include "support/pixel_harness.h"
 

@@ -3,7 +3,8 @@
 #include <gtest/gtest.h>
 #include <tiffio.h>
 
-#include <fstream>
+#include <tuple>
+#include <vector>
 
 #include "support/temp_dir.h"
 
@@ -28,39 +29,28 @@ RgbaImage colourPattern() {
 
 DepthImage depthPattern() { return DepthImage{2, 3, {0, 1, 256, 4660, 65534, 65535}}; }
 
+// Width, height, samples per pixel, bits per sample, photometric and
+// orientation.
+auto layoutOf(const TiffImage& t) {
+  return std::tuple(t.width, t.height, t.samplesPerPixel, t.bitsPerSample, t.photometric,
+                    t.orientation);
+}
+
+// The colour pattern as 8-bit RGB, top row first.
 void expectColourPattern(const TiffImage& tiff) {
-  EXPECT_EQ(tiff.width, 3);
-  EXPECT_EQ(tiff.height, 2);
-  EXPECT_EQ(tiff.samplesPerPixel, 3);
-  EXPECT_EQ(tiff.bitsPerSample, 8);
-  EXPECT_EQ(tiff.photometric, PHOTOMETRIC_RGB);
-  EXPECT_EQ(tiff.orientation, ORIENTATION_TOPLEFT);
-  for (int y = 0; y < 2; ++y) {
-    for (int x = 0; x < 3; ++x) {
-      const int v = 10 * (y * 3 + x);
-      EXPECT_EQ(tiff.sample(x, y, 0), v) << x << ", " << y;
-      EXPECT_EQ(tiff.sample(x, y, 1), v + 1) << x << ", " << y;
-      EXPECT_EQ(tiff.sample(x, y, 2), v + 2) << x << ", " << y;
-    }
+  EXPECT_EQ(layoutOf(tiff), std::tuple(3, 2, 3, 8, PHOTOMETRIC_RGB, ORIENTATION_TOPLEFT));
+  std::vector<std::uint16_t> samples;
+  for (std::uint16_t v = 0; v < 60; v += 10) {
+    samples.insert(samples.end(), {v, std::uint16_t(v + 1), std::uint16_t(v + 2)});
   }
+  EXPECT_EQ(tiff.samples, samples);
 }
 
-void expectDepthPattern(const TiffImage& tiff) {
-  EXPECT_EQ(tiff.width, 2);
-  EXPECT_EQ(tiff.height, 3);
-  EXPECT_EQ(tiff.samplesPerPixel, 1);
-  EXPECT_EQ(tiff.bitsPerSample, 16);
-  EXPECT_EQ(tiff.photometric, PHOTOMETRIC_MINISBLACK);
-  EXPECT_EQ(tiff.orientation, ORIENTATION_TOPLEFT);
-  EXPECT_EQ(tiff.samples, depthPattern().values);
-}
-
-// Colour frames are 8-bit RGB, depth frames 16-bit grey, both top row first.
+// Depth frames are 16-bit grey, top row first.
 TEST(ImageFile, FramesReplaceTheTargetInTheirFormatAndLeaveNoTemporaryFile) {
   const testing::TempDir dir;
-  const auto colour = dir / "frame.0001.tif";
+  const auto colour = testing::writeFile(dir / "frame.0001.tif", "an older frame");
   const auto depth = dir / "depth.0001.tif";
-  std::ofstream(colour) << "an older frame";
   Error error;
   ASSERT_TRUE(writeColorTiff(colour, colourPattern(), &error)) << error.message;
   ASSERT_TRUE(writeDepthTiff(depth, depthPattern(), &error)) << error.message;
@@ -69,7 +59,9 @@ TEST(ImageFile, FramesReplaceTheTargetInTheirFormatAndLeaveNoTemporaryFile) {
   expectColourPattern(*readColour);
   auto readDepth = readTiff(depth, &error);
   ASSERT_TRUE(readDepth) << error.message;
-  expectDepthPattern(*readDepth);
+  EXPECT_EQ(layoutOf(*readDepth),
+            std::tuple(2, 3, 1, 16, PHOTOMETRIC_MINISBLACK, ORIENTATION_TOPLEFT));
+  EXPECT_EQ(readDepth->samples, depthPattern().values);
   EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir.path()), {}), 2);
 }
 

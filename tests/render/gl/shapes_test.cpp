@@ -3,7 +3,6 @@
 #include <epoxy/gl.h>
 #include <gtest/gtest.h>
 
-#include <cmath>
 #include <functional>
 #include <numbers>
 #include <string>
@@ -32,12 +31,7 @@ TEST_F(ShapesTest, AConeSeenFromTheSideIsATriangleWithItsApexAtTheHeight) {
   });
   EXPECT_NEAR(frame.count(kRed), radius * height, 0.03 * radius * height);
   // Base 20 units below the centre (frame row 52, y down), apex 40 above it.
-  const auto bounds = frame.drawnBounds();
-  ASSERT_TRUE(bounds);
-  EXPECT_NEAR(bounds->bottom, 52, 1);
-  EXPECT_NEAR(bounds->top, 12, 1);
-  EXPECT_NEAR(bounds->left, 12, 1);
-  EXPECT_NEAR(bounds->right, 52, 1);
+  EXPECT_TRUE(testing::boundsNear(frame.drawnBounds(), {12, 12, 52, 52}, 1));
   // The width shrinks linearly towards the apex.
   for (int above : {5, 20, 35}) {
     const int row = 52 - above;
@@ -52,14 +46,11 @@ TEST_F(ShapesTest, TheTeapotStandsUpWithItsSpoutToTheRight) {
     red();
     drawSolidTeapot(size);
   });
-  const auto bounds = frame.drawnBounds();
-  ASSERT_TRUE(bounds);
   // Handle at x = -1.5 size, spout tip at 1.65 size, bottom at y = -0.75
   // size, knob at 0.825 size; the frame's centre is (48, 32), y down.
-  EXPECT_NEAR(bounds->left, 48 - 1.5 * size, 1.5);
-  EXPECT_NEAR(bounds->right, 48 + 1.65 * size, 1.5);
-  EXPECT_NEAR(bounds->bottom, 32 + 0.75 * size, 1.5);
-  EXPECT_NEAR(bounds->top, 32 - 0.825 * size, 1.5);
+  EXPECT_TRUE(testing::boundsNear(
+      frame.drawnBounds(), {48 - 1.5 * size, 32 - 0.825 * size, 48 + 1.65 * size, 32 + 0.75 * size},
+      1.5));
   EXPECT_TRUE(testing::pixelIs(frame, 48, 32, kRed));
 }
 
@@ -161,9 +152,11 @@ TEST_F(ShapesTest, DegenerateRequestsDrawNothing) {
       {"sphere 1 stack", [] { drawSolidSphere(10, 16, 1); }},
       {"wire sphere negative slices", [] { drawWireSphere(10, -4, 8); }},
       {"cube edge 0", [] { drawSolidCube(0); }},
+      {"cube edge -1", [] { drawSolidCube(-1); }},
       {"cube edge infinite", [&] { drawSolidCube(inf); }},
       {"cone height 0", [] { drawSolidCone(10, 0, 16, 2); }},
       {"cone 0 stacks", [] { drawSolidCone(10, 10, 16, 0); }},
+      {"cone -7 slices and stacks", [] { drawSolidCone(10, 10, -7, -7); }},
       {"teapot size -2", [] { drawSolidTeapot(-2); }},
       {"teapot size NaN", [&] { drawSolidTeapot(nan); }},
   };
@@ -177,11 +170,18 @@ TEST_F(ShapesTest, DegenerateRequestsDrawNothing) {
 }
 
 TEST_F(ShapesTest, HugeSubdivisionsAreClampedAndStillDraw) {
-  const Frame frame = render(32, 32, [] {
-    red();
-    drawSolidCone(10, 10, std::numeric_limits<int>::max(), 1);
-  });
-  EXPECT_NEAR(frame.count(kRed), std::numbers::pi * 100, 0.03 * std::numbers::pi * 100);
+  const int huge = std::numeric_limits<int>::max();
+  const std::pair<std::string, std::function<void()>> cases[] = {
+      {"cone", [&] { drawSolidCone(10, 10, huge, 1); }},
+      {"sphere", [&] { drawSolidSphere(10, huge, huge); }},
+  };
+  for (const auto& [name, draw] : cases) {
+    const Frame frame = render(32, 32, [&] {
+      red();
+      draw();
+    });
+    EXPECT_NEAR(frame.count(kRed), std::numbers::pi * 100, 0.03 * std::numbers::pi * 100) << name;
+  }
 }
 
 }  // namespace
