@@ -126,9 +126,7 @@ bool writeReconstruction(const std::filesystem::path& path) {
 // log nowhere, so a line per freed layer does not get in the way.
 struct BenchFile {
   BenchFile() {
-    auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
-    registerApplicationDefaults(*defaults);
-    UserDefaults::setStandardUserDefaults(std::move(defaults));
+    (void)useFactoryDefaultsInMemory();
     setLogSink([](std::string_view) {});
 
     const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");

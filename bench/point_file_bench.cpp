@@ -71,9 +71,7 @@ bool plainRead(const std::filesystem::path& path, char* buffer, std::size_t size
 // in the way.
 struct BenchFile {
   BenchFile() {
-    auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
-    registerApplicationDefaults(*defaults);
-    UserDefaults::setStandardUserDefaults(std::move(defaults));
+    (void)useFactoryDefaultsInMemory();
     setLogSink([](std::string_view) {});
 
     const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");

@@ -14,9 +14,7 @@
 namespace cloudreel::fuzz {
 
 inline void useFactoryDefaultsAndSilentLog() {
-  auto defaults = std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>());
-  registerApplicationDefaults(*defaults);
-  UserDefaults::setStandardUserDefaults(std::move(defaults));
+  (void)useFactoryDefaultsInMemory();
   setLogSink([](std::string_view) {});
 }
 

@@ -6,6 +6,13 @@
 
 namespace cloudreel {
 
+std::unique_ptr<UserDefaults> useFactoryDefaultsInMemory() {
+  auto previous = UserDefaults::setStandardUserDefaults(
+      std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>()));
+  registerApplicationDefaults(UserDefaults::standardUserDefaults());
+  return previous;
+}
+
 void registerApplicationDefaults(UserDefaults& defaults) {
   const std::string home = homeDirectory().string();
   auto colour = [](float r, float g, float b) {

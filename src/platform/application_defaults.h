@@ -29,6 +29,12 @@ inline constexpr std::string_view kPointCachePathKey = "KTPointCachePath";
 // Registers the factory settings; registering again changes nothing.
 void registerApplicationDefaults(UserDefaults& defaults);
 
+// Makes the standard defaults a fresh store in memory holding the factory
+// settings and answers the defaults it replaced: for programs that must
+// neither read nor change the user's own settings (tests, benchmarks,
+// fuzzers).
+std::unique_ptr<UserDefaults> useFactoryDefaultsInMemory();
+
 // The colour archived under a key; null when the key holds no valid colour.
 std::shared_ptr<Color> colorForDefaultsKey(const UserDefaults& defaults, std::string_view key);
 void setColorForDefaultsKey(UserDefaults& defaults, const Color& color, std::string_view key);

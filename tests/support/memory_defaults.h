@@ -10,11 +10,7 @@
 namespace cloudreel::testing {
 
 struct MemoryDefaults {
-  MemoryDefaults()
-      : previous(UserDefaults::setStandardUserDefaults(
-            std::make_unique<UserDefaults>(std::make_unique<MemoryDefaultsStore>()))) {
-    registerApplicationDefaults(UserDefaults::standardUserDefaults());
-  }
+  MemoryDefaults() : previous(useFactoryDefaultsInMemory()) {}
   ~MemoryDefaults() { UserDefaults::setStandardUserDefaults(std::move(previous)); }
   std::unique_ptr<UserDefaults> previous;
 };
