@@ -18,6 +18,7 @@
 #include <numeric>
 #include <string>
 
+#include "bench_files.h"
 #include "platform/byte_stream.h"
 #include "platform/class_registry.h"
 #include "platform/color.h"
@@ -55,8 +56,7 @@ std::size_t blobSize() {
 }
 
 std::filesystem::path benchFile(const char* name) {
-  const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");
-  return std::filesystem::path(dir ? dir : std::filesystem::temp_directory_path().c_str()) / name;
+  return bench::benchFolder() / name;
 }
 
 // Peak resident memory is measured per phase: writing 5 to clear_refs resets

@@ -26,6 +26,7 @@
 #include <string_view>
 
 #include "import/bundler_file.h"
+#include "bench_files.h"
 #include "peak_memory.h"
 #include "platform/application_defaults.h"
 #include "platform/log.h"
@@ -67,11 +68,12 @@ void putScientific(std::string& text, double value, char separator) {
 }
 
 bool writeReconstruction(const std::filesystem::path& path) {
-  std::FILE* file = std::fopen(path.c_str(), "wb");
-  if (file == nullptr) {
+  bench::ChunkedTextFile file(path);
+  if (!file.isOpen()) {
     return false;
   }
-  std::string text = "# Bundle file v0.3\n";
+  std::string& text = file.text();
+  text = "# Bundle file v0.3\n";
   put(text, kCameras, ' ');
   put(text, kPoints, '\n');
   // A ring of cameras 10 units from the origin, looking at it: R turns
@@ -110,15 +112,11 @@ bool writeReconstruction(const std::filesystem::path& path) {
       put(text, ((i + v) % 2000 - 1000) * 0.25, ' ');
       put(text, ((i * 3 + v) % 1500 - 750) * 0.5, v + 1 == views ? '\n' : ' ');
     }
-    if (text.size() > (std::size_t{1} << 24) || i + 1 == kPoints) {
-      if (std::fwrite(text.data(), 1, text.size(), file) != text.size()) {
-        std::fclose(file);
-        return false;
-      }
-      text.clear();
+    if (!file.flushIfFull()) {
+      return false;
     }
   }
-  return std::fclose(file) == 0;
+  return file.close();
 }
 
 // The reconstruction (root/bundle/bundle.out), written on first use and
@@ -129,9 +127,7 @@ struct BenchFile {
     (void)useFactoryDefaultsInMemory();
     setLogSink([](std::string_view) {});
 
-    const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");
-    root = std::filesystem::path(dir ? dir : std::filesystem::temp_directory_path()) /
-           ("cloudreel-bench-bundle-" + std::to_string(::getpid()));
+    root = bench::benchFolder() / ("cloudreel-bench-bundle-" + std::to_string(::getpid()));
     std::error_code ec;
     std::filesystem::create_directories(root / "bundle", ec);
     path = root / "bundle" / "bundle.out";

@@ -24,6 +24,7 @@
 
 #include "import/ply/ply.h"
 #include "import/ply_file.h"
+#include "bench_files.h"
 #include "peak_memory.h"
 
 namespace cloudreel {
@@ -60,11 +61,12 @@ std::string header(const char* format) {
 }
 
 bool writeFile(const std::filesystem::path& path, bool ascii) {
-  std::FILE* file = std::fopen(path.c_str(), "wb");
-  if (file == nullptr) {
+  bench::ChunkedTextFile file(path);
+  if (!file.isOpen()) {
     return false;
   }
-  std::string text = header(ascii ? "ascii" : "binary_little_endian");
+  std::string& text = file.text();
+  text = header(ascii ? "ascii" : "binary_little_endian");
   // Appends a number and the separator after it.
   auto put = [&text](auto value, char separator) {
     char digits[32];
@@ -85,22 +87,17 @@ bool writeFile(const std::filesystem::path& path, bool ascii) {
       std::memcpy(bytes, &r, 15);  // little-endian machines only, as the benchmarks run
       text.append(bytes, 15);
     }
-    if (text.size() > (std::size_t{1} << 24) || i + 1 == kVertices) {
-      if (std::fwrite(text.data(), 1, text.size(), file) != text.size()) {
-        std::fclose(file);
-        return false;
-      }
-      text.clear();
+    if (!file.flushIfFull()) {
+      return false;
     }
   }
-  return std::fclose(file) == 0;
+  return file.close();
 }
 
 // The two files, written on first use and removed when the program ends.
 struct BenchFiles {
   BenchFiles() {
-    const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");
-    std::filesystem::path folder = dir ? dir : std::filesystem::temp_directory_path();
+    const std::filesystem::path folder = bench::benchFolder();
     binary = folder / "cloudreel-bench-vertices-binary.ply";
     ascii = folder / "cloudreel-bench-vertices-ascii.ply";
     ok = writeFile(binary, false) && writeFile(ascii, true);

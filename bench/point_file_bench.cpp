@@ -21,6 +21,7 @@
 #include <memory>
 #include <string>
 
+#include "bench_files.h"
 #include "platform/application_defaults.h"
 #include "platform/error.h"
 #include "platform/log.h"
@@ -74,9 +75,7 @@ struct BenchFile {
     (void)useFactoryDefaultsInMemory();
     setLogSink([](std::string_view) {});
 
-    const char* dir = std::getenv("CLOUDREEL_BENCH_DIR");
-    path = std::filesystem::path(dir ? dir : std::filesystem::temp_directory_path()) /
-           "cloudreel-bench-points.rwb";
+    path = bench::benchFolder() / "cloudreel-bench-points.rwb";
     PointLayer layer;
     if (layer.allocatePointArrayWithSize(kPoints) == nullptr) {
       return;
