@@ -77,27 +77,49 @@ bool RunLoop::runPending() {
   return ran;
 }
 
-void RunLoop::runUntil(Clock::time_point deadline) {
-  runUntil([] { return false; }, deadline - Clock::now());
+bool RunLoop::runUntil(Clock::time_point deadline) {
+  bool stopped = false;
+  (void)runUntilStopped([] { return false; }, deadline, &stopped);
+  return stopped;
 }
 
 bool RunLoop::runUntil(const std::function<bool()>& condition, Clock::duration timeout) {
-  const auto deadline = Clock::now() + timeout;
-  {
+  return runUntilStopped(condition, Clock::now() + timeout, nullptr);
+}
+
+bool RunLoop::runUntilStopped(const std::function<bool()>& condition, Clock::time_point deadline,
+                              bool* stopped) {
+  // A stop requested before this run began is honoured, not cleared: the
+  // thread that asked cannot know whether the run had started yet. Each
+  // stop ends exactly one run.
+  auto takeStop = [this, stopped] {
     std::lock_guard lock(mutex_);
+    if (!stopRequested_) {
+      return false;
+    }
     stopRequested_ = false;
-  }
+    if (stopped != nullptr) {
+      *stopped = true;
+    }
+    return true;
+  };
   while (true) {
     if (condition()) {
       return true;
+    }
+    if (takeStop()) {
+      return condition();
+    }
+    // The deadline holds even while tasks keep coming.
+    if (Clock::now() >= deadline) {
+      return condition();
     }
     if (runOne()) {
       continue;
     }
     std::unique_lock lock(mutex_);
     if (stopRequested_) {
-      stopRequested_ = false;
-      return condition();
+      continue;
     }
     auto wakeAt = deadline;
     for (const auto& [id, timer] : timers_) {

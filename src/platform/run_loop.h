@@ -40,14 +40,17 @@ class RunLoop {
   void invalidateTimer(TimerId id);
   bool isTimerValid(TimerId id) const;
 
-  // Runs tasks and timers until stop() or the deadline.
-  void runUntil(Clock::time_point deadline);
+  // Runs tasks and timers until stop() or the deadline; answers whether a
+  // stop ended it.
+  bool runUntil(Clock::time_point deadline);
   // Runs until the condition holds (checked after each task or timer) or the
   // timeout passes; answers whether the condition held.
   bool runUntil(const std::function<bool()>& condition, Clock::duration timeout);
   // Runs what is ready now without waiting; answers whether anything ran.
   bool runPending();
-  // Makes a running loop return after its current task; safe from any thread.
+  // Makes a running loop return after its current task; safe from any
+  // thread. A stop that arrives while no run is under way ends the next run
+  // at its start, so a stop sent just before a run starts is never lost.
   void stop();
 
  private:
@@ -59,6 +62,8 @@ class RunLoop {
   };
   // Runs one ready task or due timer; answers whether one ran.
   bool runOne();
+  bool runUntilStopped(const std::function<bool()>& condition, Clock::time_point deadline,
+                       bool* stopped);
 
   mutable std::mutex mutex_;
   std::condition_variable wake_;
