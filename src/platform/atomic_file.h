@@ -3,6 +3,10 @@
 // temporary file beside it (same folder, so the rename cannot cross file
 // systems), then rename it over the target. A failed or abandoned write
 // leaves the old file as it was and removes the temporary.
+//
+// A target that is a symbolic link is followed: the file it names is
+// replaced and the link stays a link. The replacement keeps the permission
+// bits of the file it replaces.
 
 #include <cstdint>
 #include <filesystem>
@@ -14,12 +18,13 @@ namespace cloudreel {
 
 class AtomicFileReplacement {
  public:
-  explicit AtomicFileReplacement(std::filesystem::path target);
+  explicit AtomicFileReplacement(const std::filesystem::path& target);
   // Removes the temporary file unless committed.
   ~AtomicFileReplacement();
   AtomicFileReplacement(const AtomicFileReplacement&) = delete;
   AtomicFileReplacement& operator=(const AtomicFileReplacement&) = delete;
 
+  // The file that is replaced: the given path with its links followed.
   const std::filesystem::path& target() const { return target_; }
   // Where the writer puts the new contents (for writers that take a path).
   const std::filesystem::path& temporaryPath() const { return temporary_; }

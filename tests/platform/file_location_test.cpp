@@ -2,11 +2,18 @@
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
+#include <cstring>
+#include <vector>
+
 #include "platform/atomic_file.h"
+#include "support/file_size_limit.h"
 #include "support/temp_dir.h"
 
 namespace cloudreel {
 namespace {
+
+namespace fs = std::filesystem;
 
 TEST(FileLocation, PathComponents) {
   struct Case {
@@ -45,18 +52,49 @@ TEST(FileLocation, ConfigFolderFollowsXdgOnlyWhenAbsolute) {
   }
 }
 
-TEST(AtomicFile, ReplacesWholeOrLeavesTheOldFile) {
+TEST(AtomicFile, ReplacesWholeOrLeavesTheOldFileByteForByte) {
   testing::TempDir dir;
   const auto target = dir / "doc.reel";
-  const std::uint8_t first[] = {1, 2, 3};
+  const std::vector<std::uint8_t> first = {1, 2, 3};
   ASSERT_TRUE(writeFileAtomically(target, first, nullptr));
-  EXPECT_EQ(std::filesystem::file_size(target), 3u);
-  // An abandoned replacement, which leaves the old file and no temporary
-  // behind, is seen through a refused archive.
+  EXPECT_EQ(testing::readFile(target), "\x01\x02\x03");
 
   Error error;
   EXPECT_FALSE(writeFileAtomically(dir / "missing-folder" / "x", first, &error));
   EXPECT_NE(error.message.find("missing-folder"), std::string::npos);
+
+  // A full disk: the write fails with the system's reason, the old file
+  // stays as it was and no temporary is left beside it.
+  const std::vector<std::uint8_t> large(64 * 1024, 7);
+  {
+    const testing::FileSizeLimit full(4096);
+    EXPECT_FALSE(writeFileAtomically(target, large, &error));
+  }
+  EXPECT_NE(error.message.find(std::strerror(EFBIG)), std::string::npos) << error.message;
+  EXPECT_EQ(testing::readFile(target), "\x01\x02\x03");
+  EXPECT_EQ(std::distance(fs::directory_iterator(dir.path()), fs::directory_iterator()), 1);
+}
+
+TEST(AtomicFile, ReplacesTheFileALinkNamesAndKeepsItsPermissions) {
+  testing::TempDir dir;
+  fs::create_directories(dir / "real");
+  const std::vector<std::uint8_t> bytes = {4, 5};
+  testing::writeFile(dir / "real/cloud.rwb", "old");
+  fs::permissions(dir / "real/cloud.rwb", fs::perms::owner_read | fs::perms::owner_write);
+  // A chain of two links, the first relative to its own folder.
+  fs::create_symlink("real/cloud.rwb", dir / "middle.rwb");
+  fs::create_symlink(dir / "middle.rwb", dir / "link.rwb");
+  fs::create_symlink("new.rwb", dir / "dangling.rwb");
+
+  ASSERT_TRUE(writeFileAtomically(dir / "link.rwb", bytes, nullptr));
+  ASSERT_TRUE(writeFileAtomically(dir / "dangling.rwb", bytes, nullptr));
+  EXPECT_TRUE(fs::is_symlink(dir / "link.rwb"));
+  EXPECT_TRUE(fs::is_symlink(dir / "middle.rwb"));
+  EXPECT_TRUE(fs::is_symlink(dir / "dangling.rwb"));
+  EXPECT_EQ(testing::readFile(dir / "real/cloud.rwb"), "\x04\x05");
+  EXPECT_EQ(testing::readFile(dir / "new.rwb"), "\x04\x05");
+  EXPECT_EQ(fs::status(dir / "real/cloud.rwb").permissions(),
+            fs::perms::owner_read | fs::perms::owner_write);
 }
 
 }  // namespace
