@@ -45,17 +45,40 @@ std::uint32_t wordAt(const std::uint8_t* header, std::size_t offset) {
 }
 
 // Writes into a temporary beside the file and renames it into place, so a
-// failed save leaves the previous file whole.
+// failed save leaves the previous file whole. It keeps the system's reason
+// for the first failure (no space, no permission, a folder in the way), which
+// the save adds to its own message.
 class Writer {
  public:
   explicit Writer(const std::filesystem::path& path) : replacement_(path) {
-    out_ = FileOutputStream::create(replacement_.temporaryPath(), nullptr);
+    out_ = FileOutputStream::create(replacement_.temporaryPath(), &reason_);
   }
-  bool write(const void* data, std::size_t size) { return out_ && out_->write(data, size); }
-  bool finish() { return out_ && out_->sync() && out_->close() && replacement_.commit(nullptr); }
+  bool write(const void* data, std::size_t size) {
+    return out_ && (out_->write(data, size) || keepReason());
+  }
+  bool finish() {
+    if (!out_) {
+      return false;
+    }
+    if (!out_->sync() || !out_->close()) {
+      return keepReason();
+    }
+    return replacement_.commit(&reason_);
+  }
+  // The design's message, then why when the system said why.
+  std::string failure(const char* message) const {
+    return reason_.code != 0 ? std::string(message) + ": " + std::strerror(reason_.code)
+                             : std::string(message);
+  }
 
  private:
+  bool keepReason() {
+    reason_ = out_->error();
+    return false;
+  }
+
   AtomicFileReplacement replacement_;
+  Error reason_;
   std::unique_ptr<FileOutputStream> out_;
 };
 
@@ -71,17 +94,17 @@ bool PointLayer::savePointsToURLError(const std::filesystem::path& url, Error* e
   std::memcpy(header.data() + 20, &faceCount, 4);
   // A file that cannot be created fails here, at its first write.
   if (!file.write(header.data(), header.size())) {
-    return fail(error, "Cannot write header");
+    return fail(error, file.failure("Cannot write header"));
   }
   if (!file.write(bbox().data(), kBoxSize)) {
-    return fail(error, "Cannot write bounding box");
+    return fail(error, file.failure("Cannot write bounding box"));
   }
   // The writer always writes 16-byte records; never more than the array has.
   const std::size_t bytes =
       std::min<std::size_t>(std::size_t{pointCount} * 16, points_ ? points_->size() : 0);
   if (bytes < std::size_t{pointCount} * 16 ||
       !file.write(points_ ? points_->data() : nullptr, bytes)) {
-    return fail(error, "Cannot write points: short read");
+    return fail(error, file.failure("Cannot write points: short read"));
   }
   if (faceCount != 0) {
     const std::size_t indices =
@@ -89,7 +112,7 @@ bool PointLayer::savePointsToURLError(const std::filesystem::path& url, Error* e
     (void)file.write(triangles_.data(), indices * 4);
   }
   if (!file.finish()) {
-    return fail(error, "Cannot save file");
+    return fail(error, file.failure("Cannot save file"));
   }
   return false;
 }

@@ -7,6 +7,7 @@
 #include <cstring>
 
 #include "scene/archive_helpers.h"
+#include "support/file_size_limit.h"
 #include "support/memory_defaults.h"
 #include "support/scripted_user_interaction.h"
 #include "support/temp_dir.h"
@@ -283,6 +284,41 @@ TEST_F(PointLayerTest, SavingBackNeedsALinkAndClearsTheModifiedMark) {
   linked->saveLinkedLayer();
   EXPECT_FALSE(linked->isModified());
   EXPECT_EQ(readFile(path)[88 + 16 + 12], 99);
+}
+
+// Saving back through a link writes the file the link names and keeps its
+// permissions; a save that fails says why and leaves the old file as it was.
+TEST_F(PointLayerTest, SavesThroughLinksAndFailedSavesKeepTheOldFileAndSayWhy) {
+  const auto real = saved(*layerOf(3), "real.rwb");
+  std::filesystem::permissions(real, std::filesystem::perms::owner_read |
+                                         std::filesystem::perms::owner_write);
+  std::filesystem::create_symlink("real.rwb", dir / "link.rwb");
+  const auto linked = PointLayer::initWithURLShouldLink(dir / "link.rwb", true);
+  ASSERT_TRUE(linked);
+  linked->colorPoints()[1].r = 99;
+  linked->setIsModified(true);
+  linked->saveLinkedLayer();
+  EXPECT_TRUE(std::filesystem::is_symlink(dir / "link.rwb"));
+  EXPECT_EQ(readFile(real)[88 + 16 + 12], 99);
+  EXPECT_EQ(std::filesystem::status(real).permissions(),
+            std::filesystem::perms::owner_read | std::filesystem::perms::owner_write);
+
+  const std::string before = readFile(real);
+  const auto big = layerOf(10000);
+  Error error;
+  {
+    const testing::FileSizeLimit full(64 * 1024);
+    EXPECT_TRUE(big->savePointsToURLError(real, &error));
+  }
+  EXPECT_EQ(error.message, std::string("Cannot write points: short read: ") + std::strerror(EFBIG));
+  EXPECT_EQ(error.domain, "myDomain");
+  std::filesystem::create_directory(dir / "folder.rwb");
+  EXPECT_TRUE(big->savePointsToURLError(dir / "folder.rwb", &error));
+  EXPECT_EQ(error.message, std::string("Cannot save file: ") + std::strerror(EISDIR));
+  EXPECT_EQ(readFile(real), before);
+  EXPECT_FALSE(std::filesystem::exists(dir / "missing/x.rwb"));
+  EXPECT_TRUE(big->savePointsToURLError(dir / "missing/x.rwb", &error));
+  EXPECT_EQ(error.message, std::string("Cannot write header: ") + std::strerror(ENOENT));
 }
 
 }  // namespace
