@@ -120,10 +120,15 @@ void SourceCamera::uploadOpenGLTexture() {
   }
   DecodedPhotograph photo = decode(photographFile_);
   if (!photo.pixels) {
+    // Logged once: from now on the camera has no photograph to decode.
     const char* reason = stbi_failure_reason();
     logf("cannot decode photograph %s: %s", photographFile_.string(),
          reason != nullptr ? reason : "unknown reason");
     decodeFailed_ = true;
+    imageWidth_ = 0;
+    imageHeight_ = 0;
+    setAspect(1.0f);
+    setHasImage(false);
     return;
   }
   GLint maxSize = 0;
@@ -159,7 +164,7 @@ void SourceCamera::uploadOpenGLTexture() {
 }
 
 void SourceCamera::drawImageWithFrustumLength(float length, float opacity) {
-  if (!selected()) {
+  if (!selected() || decodeFailed_) {
     return;
   }
   const float h = length * std::tan(fieldOfViewInRadians() / 2.0f);
@@ -172,6 +177,9 @@ void SourceCamera::drawImageWithFrustumLength(float length, float opacity) {
     texture_.reset();
     glBindTexture(GL_TEXTURE_2D, 0);
     uploadOpenGLTexture();
+    if (decodeFailed_) {
+      return;
+    }
   }
   glColor4f(1.0f, 1.0f, 1.0f, opacity);
   glEnable(GL_TEXTURE_2D);
@@ -224,6 +232,7 @@ void SourceCamera::copyInto(Animatable3DObject& target) const {
   camera.imageWidth_ = imageWidth_;
   camera.imageHeight_ = imageHeight_;
   camera.photographFile_ = photographFile_;
+  camera.decodeFailed_ = decodeFailed_;
   if (hasImage_) {
     camera.setAspect(aspect());
   }

@@ -8,7 +8,9 @@
 // Only the photograph's header is read when its path is set, so a
 // reconstruction of a thousand photographs opens without decoding any of
 // them. The pixels are decoded when the texture is first needed and freed
-// as soon as they are uploaded.
+// as soon as they are uploaded. A photograph whose header reads but whose
+// pixels do not is found out only then: from that draw on the camera is one
+// without a photograph, and shows none.
 
 #include <cstdint>
 #include <filesystem>
@@ -42,7 +44,8 @@ class SourceCamera : public Camera {
   // aspect becomes width / height. A file that cannot be read as an image
   // leaves the camera without a photograph (hasImage NO, size 0), which is
   // not an error. The path is deliberately not kept in imagePath, so an
-  // archived camera comes back without its photograph.
+  // archived camera comes back without its photograph. Setting a path
+  // forgets that an earlier photograph did not decode.
   void setImagePath(const std::filesystem::path& path);
   // Always empty (see setImagePath); archived as it is.
   const std::string& imagePath() const { return imagePath_; }
@@ -62,17 +65,20 @@ class SourceCamera : public Camera {
 
   // Makes the texture from the photograph in the current context and leaves
   // it bound. The pixels are decoded now and freed once uploaded. Does
-  // nothing without a photograph, without a current context, or when the
-  // file no longer decodes (it is then not tried again until a new path is
-  // set). A photograph larger than the largest texture the context allows
-  // is uploaded at a whole fraction of its size.
+  // nothing without a photograph or without a current context. When the
+  // pixels do not decode, the failure is logged and the camera is left
+  // without a photograph (hasImage NO, size 0, aspect 1), which is not
+  // tried again until a new path is set. A photograph larger than the
+  // largest texture the context allows is uploaded at a whole fraction of
+  // its size.
   void uploadOpenGLTexture();
 
   bool canDrawImage() const override { return true; }
   // For a selected camera only, in the camera's own space: the photograph
   // on a quad at z = −length filling the frustum's end, in white at
   // `opacity`, without writing depth. A camera whose photograph is missing
-  // draws the quad untextured, in plain white.
+  // draws the quad untextured, in plain white; one whose photograph did not
+  // decode, on this draw or an earlier one, draws nothing.
   void drawImageWithFrustumLength(float length, float opacity) override;
 
   // After the camera keys: "imagePath" (string), "focal", "k1", "k2"
@@ -83,8 +89,9 @@ class SourceCamera : public Camera {
  protected:
   std::shared_ptr<Animatable3DObject> makeBlank() const override;
   // The camera copy, then focal, k1, k2 and the photograph's file and size
-  // (with the aspect), so that the cameras a camera path hands out for its
-  // frames see as their source does. The texture is not shared.
+  // (with the aspect) or that it did not decode, so that the cameras a
+  // camera path hands out for its frames see as their source does. The
+  // texture is not shared.
   void copyInto(Animatable3DObject& target) const override;
 
  private:
