@@ -5,6 +5,7 @@
 #include "camera/camera_field.h"
 #include "camera/source_camera.h"
 #include "import/ply/ply.h"
+#include "import/ply_file.h"
 #include "import/text_scanner.h"
 #include "platform/byte_stream.h"
 #include "scene/point_layer.h"
@@ -96,6 +97,7 @@ bool describePlyHeader(const std::filesystem::path& path, PlyHeaderDescription* 
   }
   header->format = ply_storage_mode_name(ply_get_storage_mode(ply.get()));
   header->elements.clear();
+  header->hasColor = false;
   for (p_ply_element element = ply_get_next_element(ply.get(), nullptr); element != nullptr;
        element = ply_get_next_element(ply.get(), element)) {
     PlyElementDescription& described = header->elements.emplace_back();
@@ -108,6 +110,15 @@ bool describePlyHeader(const std::filesystem::path& path, PlyHeaderDescription* 
       ply_get_property_info(property, &propertyName, nullptr, nullptr, nullptr);
       described.properties.push_back({propertyName ? propertyName : "", propertyType(property)});
     }
+  }
+  // The import reads the first "vertex" element only.
+  const auto vertex =
+      std::find_if(header->elements.begin(), header->elements.end(),
+                   [](const PlyElementDescription& e) { return e.name == "vertex"; });
+  if (vertex != header->elements.end()) {
+    header->hasColor = std::any_of(
+        vertex->properties.begin(), vertex->properties.end(),
+        [](const PlyPropertyDescription& p) { return PLYFile::propertyGivesColor(p.name); });
   }
   return true;
 }

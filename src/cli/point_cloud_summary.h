@@ -38,6 +38,10 @@ struct PlyHeaderDescription {
   // "ascii", "binary_little_endian" or "binary_big_endian".
   std::string format;
   std::vector<PlyElementDescription> elements;
+  // Whether the imported points carry the file's colours: false when the
+  // first "vertex" element has no blue value (or there is none), and the
+  // import makes every point white.
+  bool hasColor = false;
 };
 
 // What a bundle file's header line claims; the file may hold fewer.

@@ -7,7 +7,9 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
+#include <iterator>
 #include <limits>
+#include <vector>
 
 #include "import/ply/ply.h"
 #include "platform/file_location.h"
@@ -20,7 +22,9 @@ namespace {
 // stays NaN, as IEEE 754 arithmetic defines; neither can fault.
 static_assert(std::numeric_limits<float>::is_iec559 && std::numeric_limits<double>::is_iec559);
 
-// The vertex properties read, and the slot each one's values go to.
+// The vertex properties read, and the slot each one's values go to. A
+// coordinate that completes a vertex (see below) goes to its slot plus
+// kCompletingCoordinate instead.
 struct Slot {
   const char* name;
   long slot;
@@ -31,13 +35,16 @@ constexpr Slot kSlots[] = {{"x", 0}, {"y", 1}, {"z", 2},
                            {"diffuse_green", 4}, {"green", 4},
                            {"diffuse_blue", 5}, {"blue", 5}};
 // clang-format on
+constexpr long kBlueSlot = 5;
+constexpr long kCompletingCoordinate = 6;
 
-// What the read callback fills. A blue value completes a vertex; every
-// factor-th vertex is kept, vertex k going to record k / factor.
+// What the read callback fills. A blue value completes a vertex; in a file
+// without blue, the last coordinate of the element does. Every factor-th
+// vertex is kept, vertex k going to record k / factor.
 struct ReadContext {
   color_point* points = nullptr;
   // The record being filled. It stops at `capacity`, so it cannot overflow
-  // however many blue values a file holds.
+  // however many vertices a file completes.
   std::int32_t index = 0;
   std::int32_t capacity = 0;
   std::int32_t factor = 1;
@@ -52,18 +59,22 @@ struct ReadContext {
   color_point spare{};
 };
 
-// Numbers and boxes the first `count` records. Luck numbers them 0-255 over
-// and over. The box starts as record 0 and grows, axis by axis, by every
-// later record: the minimum only where a coordinate is strictly smaller,
-// the maximum only where strictly larger, so a NaN coordinate never moves
-// it. Floats compare as their doubles do, and the selects compile to min
-// and max instructions rather than branches.
-Layer::BoundingBox finishRecords(color_point* points, std::int32_t count) {
+// Numbers and boxes the first `count` records, and makes them white when
+// the file gave them no colour. Luck numbers them 0-255 over and over. The
+// box starts as record 0 and grows, axis by axis, by every later record: the
+// minimum only where a coordinate is strictly smaller, the maximum only
+// where strictly larger, so a NaN coordinate never moves it. Floats compare
+// as their doubles do, and the selects compile to min and max instructions
+// rather than branches.
+Layer::BoundingBox finishRecords(color_point* points, std::int32_t count, bool white) {
   float lo[3] = {points[0].x, points[0].y, points[0].z};
   float hi[3] = {lo[0], lo[1], lo[2]};
   for (std::int32_t i = 0; i < count; ++i) {
     color_point& p = points[i];
     p.luck = static_cast<std::uint8_t>(i);
+    if (white) {
+      p.r = p.g = p.b = 255;
+    }
     const float xyz[3] = {p.x, p.y, p.z};
     for (int axis = 0; axis < 3; ++axis) {
       lo[axis] = xyz[axis] < lo[axis] ? xyz[axis] : lo[axis];
@@ -91,6 +102,21 @@ std::uint8_t colorByte(double value) {
 #endif
 }
 
+// Ends the vertex being read. Every factor-th vertex is kept and the next
+// record begun; the vertices between are read into the spare record.
+void completeVertex(ReadContext& context) {
+  if (++context.completed < context.factor) {
+    context.target = &context.spare;
+    return;
+  }
+  context.completed = 0;
+  if (context.index < context.capacity) {
+    ++context.index;
+  }
+  context.target =
+      context.index < context.capacity ? context.points + context.index : &context.spare;
+}
+
 // Called for every value of the registered properties, so kept to a switch
 // and a store.
 int storeVertexValue(p_ply_argument argument) {
@@ -116,23 +142,67 @@ int storeVertexValue(p_ply_argument argument) {
     case 4:
       record.g = colorByte(value);
       break;
-    case 5:
+    case kBlueSlot:
       record.b = colorByte(value);
-      if (++context->completed < context->factor) {
-        context->target = &context->spare;
-        break;
-      }
-      context->completed = 0;
-      if (context->index < context->capacity) {
-        ++context->index;
-      }
-      context->target =
-          context->index < context->capacity ? context->points + context->index : &context->spare;
+      completeVertex(*context);
+      break;
+    case kCompletingCoordinate + 0:
+      record.x = static_cast<float>(value);
+      completeVertex(*context);
+      break;
+    case kCompletingCoordinate + 1:
+      record.y = static_cast<float>(value);
+      completeVertex(*context);
+      break;
+    case kCompletingCoordinate + 2:
+      record.z = static_cast<float>(value);
+      completeVertex(*context);
       break;
     default:
       break;
   }
   return 1;
+}
+
+// The properties of the "vertex" element the callbacks are bound to (the
+// first one) that are read, in the element's property order, with their
+// slots. Only the first property of a name is read, as the callbacks are
+// bound by name. The names belong to the open reader.
+struct VertexLayout {
+  std::vector<Slot> read;
+  bool hasColor = false;
+};
+
+// Without a blue value the element's colour is not read at all and the last
+// of x, y and z completes each vertex: z in every real file, but a file that
+// lists its coordinates in another order still gives one record a vertex.
+VertexLayout vertexLayout(p_ply_element element) {
+  VertexLayout layout;
+  for (p_ply_property property = ply_get_next_property(element, nullptr); property != nullptr;
+       property = ply_get_next_property(element, property)) {
+    const char* name = nullptr;
+    ply_get_property_info(property, &name, nullptr, nullptr, nullptr);
+    const auto named = [name](const Slot& s) { return std::strcmp(name, s.name) == 0; };
+    const Slot* known = std::find_if(std::begin(kSlots), std::end(kSlots), named);
+    if (known == std::end(kSlots) || std::any_of(layout.read.begin(), layout.read.end(), named)) {
+      continue;
+    }
+    layout.read.push_back({name, known->slot});
+    layout.hasColor = layout.hasColor || PLYFile::propertyGivesColor(name);
+  }
+  if (!layout.hasColor) {
+    std::erase_if(layout.read, [](const Slot& s) { return s.slot > 2; });
+    if (!layout.read.empty()) {
+      layout.read.back().slot += kCompletingCoordinate;
+    }
+  }
+  return layout;
+}
+
+bool isVertexElement(p_ply_element element) {
+  const char* name = nullptr;
+  ply_get_element_info(element, &name, nullptr);
+  return std::strcmp(name, "vertex") == 0;
 }
 
 }  // namespace
@@ -153,26 +223,19 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   context.factor = factor;
   context.target = &context.spare;
   long vertexCount = 0;
-  for (p_ply_element element = ply_get_next_element(ply.get(), nullptr); element != nullptr;
-       element = ply_get_next_element(ply.get(), element)) {
-    const char* elementName = nullptr;
-    ply_get_element_info(element, &elementName, nullptr);
-    if (std::strcmp(elementName, "vertex") != 0) {
-      continue;
-    }
-    for (p_ply_property property = ply_get_next_property(element, nullptr); property != nullptr;
-         property = ply_get_next_property(element, property)) {
-      const char* propertyName = nullptr;
-      ply_get_property_info(property, &propertyName, nullptr, nullptr, nullptr);
-      for (const Slot& slot : kSlots) {
-        if (std::strcmp(propertyName, slot.name) != 0) {
-          continue;
-        }
-        const long count =
-            ply_set_read_cb(ply.get(), "vertex", slot.name, storeVertexValue, &context, slot.slot);
-        if (slot.slot == 0) {
-          vertexCount = count;
-        }
+  bool hasColor = true;
+  p_ply_element vertex = ply_get_next_element(ply.get(), nullptr);
+  while (vertex != nullptr && !isVertexElement(vertex)) {
+    vertex = ply_get_next_element(ply.get(), vertex);
+  }
+  if (vertex != nullptr) {
+    const VertexLayout layout = vertexLayout(vertex);
+    hasColor = layout.hasColor;
+    for (const Slot& slot : layout.read) {
+      const long count =
+          ply_set_read_cb(ply.get(), "vertex", slot.name, storeVertexValue, &context, slot.slot);
+      if (slot.slot == 0 || slot.slot == kCompletingCoordinate) {
+        vertexCount = count;
       }
     }
   }
@@ -197,15 +260,20 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   ply.reset();
 
   // Every record is numbered and boxed, those the read never reached (a
-  // file without colour fills only record 0) with their zeroed contents.
+  // file with both colour namings fills only the first half) with their
+  // zeroed contents; a file without colour gives every record white.
   // Downsampled, a record's luck is its own number, not its vertex's, and
   // only the array's records are touched. With no records, as when the
   // factor exceeds the vertex count, the box stays as a blank layer's.
   if (n > 0) {
-    layer->setBoundingBox(finishRecords(points, static_cast<std::int32_t>(n)));
+    layer->setBoundingBox(finishRecords(points, static_cast<std::int32_t>(n), !hasColor));
   }
   layer->setNPoints(static_cast<std::int32_t>(n));
   return layer;
+}
+
+bool PLYFile::propertyGivesColor(std::string_view name) {
+  return name == "blue" || name == "diffuse_blue";
 }
 
 bool PLYFile::savePointsToURLError(const std::filesystem::path&, Error*) const { return false; }

@@ -1,9 +1,10 @@
 #pragma once
 // The point layer made from a PLY file: the positions and colours of the
 // file's "vertex" element, read once into the layer's packed array when the
-// layer is made. From then on it is an ordinary inline point layer that
-// always has true colour and never writes itself back to a file; it archives
-// and copies exactly as a PointLayer does.
+// layer is made. A file whose vertices have no colour gives white points.
+// From then on it is an ordinary inline point layer that always has true
+// colour and never writes itself back to a file; it archives and copies
+// exactly as a PointLayer does.
 
 #include <cstdint>
 #include <filesystem>
@@ -25,6 +26,12 @@ class PLYFile : public PointLayer {
   // cannot be read; the reader reports why on standard error ("RPly: ...").
   static std::shared_ptr<PLYFile> initWithURLDownsample(const std::filesystem::path& url,
                                                         std::int32_t factor);
+
+  // Whether a property of the "vertex" element gives the points their
+  // colour: a blue value, "blue" or "diffuse_blue", is what completes a
+  // coloured vertex. Where the first "vertex" element has no such property
+  // its red and green are not read either and every point is white.
+  static bool propertyGivesColor(std::string_view name);
 
   std::string_view className() const override { return "PLYFile"; }
 

@@ -98,10 +98,9 @@ TEST(PLYFile, KeepsEveryFactorthVertexWithinTheArray) {
 }
 
 // A blue value completes a vertex: a file with both namings completes each
-// twice, one without colour fills record 0 over and over. Values with no
-// record left are dropped, never written past the array. A colour keeps the
-// low byte of its value truncated to 64 bits, or 0 when it has none; a
-// coordinate past a float's range is infinite.
+// twice. Values with no record left are dropped, never written past the
+// array. A colour keeps the low byte of its value truncated to 64 bits, or 0
+// when it has none; a coordinate past a float's range is infinite.
 TEST(PLYFile, FillsRecordsSafelyFromOddLayoutsAndValues) {
   const testing::TempDir dir;
   auto both = xyzAnd("uchar diffuse_red", "uchar diffuse_green", "uchar diffuse_blue");
@@ -113,8 +112,6 @@ TEST(PLYFile, FillsRecordsSafelyFromOddLayoutsAndValues) {
   } cases[] = {
       {{{"vertex", both, {{1, 2, 3, 4, 5, 6, 7, 8, 9}, {10, 11, 12, 13, 14, 15, 16, 17, 18}}}},
        {{1, 2, 3, 4, 5, 6, 0}, {0, 0, 0, 7, 8, 9, 1}}},
-      {{{"vertex", kXyz, {{1, 2, 3}, {4, 5, 6}, {7, 8, 9}}}},
-       {{7, 8, 9, 0, 0, 0, 0}, {0, 0, 0, 0, 0, 0, 1}, {0, 0, 0, 0, 0, 0, 2}}},
       // The callbacks are bound to the first "vertex" element, which has no
       // x: the count is 0 and its blue values find no record.
       {{{"vertex", {"uchar blue"}, {{1}, {2}}}, {"vertex", kXyz, {{1, 2, 3}}}}, {}},
@@ -127,6 +124,47 @@ TEST(PLYFile, FillsRecordsSafelyFromOddLayoutsAndValues) {
         PLYFile::initWithURLDownsample(writePly(dir / "v.ply", "binary_big_endian", c.elements), 1);
     ASSERT_TRUE(layer);
     EXPECT_EQ(recordsOf(*layer), c.records);
+  }
+}
+
+// Without a blue value the last coordinate completes a vertex, whatever
+// the order of the coordinates, and every point is white: red and green
+// alone are not read.
+TEST(PLYFile, AFileWithoutColourGivesOneWhitePointAVertex) {
+  const testing::TempDir dir;
+  constexpr int w = 255;
+  const struct {
+    std::vector<std::string> properties;
+    std::vector<std::vector<double>> rows;
+    int factor;
+    std::vector<Record> records;
+  } cases[] = {
+      {kXyz,
+       {{1, 2, 3}, {4, 5, 6}, {7, 8, 9}},
+       1,
+       {{1, 2, 3, w, w, w, 0}, {4, 5, 6, w, w, w, 1}, {7, 8, 9, w, w, w, 2}}},
+      {{"float z", "uchar red", "float x", "float y", "uchar green"},
+       {{3, 10, 1, 2, 20}, {6, 10, 4, 5, 20}},
+       1,
+       {{1, 2, 3, w, w, w, 0}, {4, 5, 6, w, w, w, 1}}},
+      {{"float x", "float y", "uchar intensity"},
+       {{1, 2, 50}, {4, 5, 50}},
+       1,
+       {{1, 2, 0, w, w, w, 0}, {4, 5, 0, w, w, w, 1}}},
+      {kXyz,
+       {{1, 2, 3}, {4, 5, 6}, {7, 8, 9}, {0, 0, 0}, {0, 0, 0}},
+       2,
+       {{1, 2, 3, w, w, w, 0}, {7, 8, 9, w, w, w, 1}}},
+  };
+  for (const std::string format : {"ascii", "binary_little_endian"}) {
+    for (const auto& c : cases) {
+      SCOPED_TRACE(format + ", first " + c.properties.front() + ", factor " +
+                   std::to_string(c.factor));
+      const auto layer = PLYFile::initWithURLDownsample(
+          writePly(dir / "plain.ply", format, {{"vertex", c.properties, c.rows}}), c.factor);
+      ASSERT_TRUE(layer);
+      EXPECT_EQ(recordsOf(*layer), c.records);
+    }
   }
 }
 
