@@ -2,8 +2,9 @@
 // reconstruction laid out as the import expects it: root/bundle/bundle.out,
 // with root/list.txt naming the photographs. The list is fixed and names, in
 // camera order, a PNG and a JPEG that are there (one by a "/"-rooted name),
-// a file that is not an image, a folder, a missing file and a blank line, so
-// every way a camera gets or lacks a photograph is taken.
+// a file that is not an image, a folder, a missing file, a blank line, the
+// PNG again, and the JPEG by another machine's path that is found by its
+// trailing part, so every way a camera gets or lacks a photograph is taken.
 //
 // The layer is made as the application's import makes it, then everything
 // it claims is read: every byte of the records, the bounding box, each
@@ -55,7 +56,7 @@ class Reconstruction {
     // the third camera.
     write(root_ / "list.txt",
           "images/a.png 0 1234.5\n/images/b.jpg\r\nimages/text.jpg\nimages/folder.jpg\n"
-          "images/missing.jpg 0 1\n\nimages/a.png\n");
+          "images/missing.jpg 0 1\n\nimages/a.png\n/home/elsewhere/proj/images/b.jpg\n");
   }
   ~Reconstruction() {
     std::error_code ignored;
@@ -139,7 +140,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     fail("the camera field does not hold the cameras counted");
   }
   // The photograph widths the list gives the cameras, whatever the file.
-  constexpr std::array<int, 8> kWidths = {4, 3, 0, 0, 0, 0, 0, 4};
+  constexpr std::array<int, 9> kWidths = {4, 3, 0, 0, 0, 0, 0, 4, 3};
   for (std::size_t i = 0; i < field->cameras().size(); ++i) {
     const auto* bundler = dynamic_cast<const BundlerCamera*>(field->cameras()[i].get());
     if (bundler == nullptr || bundler->number() != static_cast<int>(i)) {

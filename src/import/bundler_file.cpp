@@ -6,6 +6,8 @@
 #include <limits>
 #include <optional>
 #include <string>
+#include <string_view>
+#include <system_error>
 
 #include "camera/bundler_camera.h"
 #include "camera/camera_field.h"
@@ -22,42 +24,98 @@ namespace {
 // The fewest bytes a point record can take: six one-digit numbers and the
 // five separators between them ("0 0 0\n0 0 0"), the view list left out.
 constexpr std::uint64_t kSmallestPointRecord = 11;
+// The fewest bytes a camera record can take: fifteen one-digit numbers and
+// the fourteen separators between them (five lines of "0 0 0").
+constexpr std::uint64_t kSmallestCameraRecord = 29;
+// The camera counts refused as no real reconstruction's (see the loader).
+constexpr std::uint64_t kCamerasAnyFileMayClaim = 4096;
+constexpr std::uint64_t kFileBytesPerCamera = 256;
+// The longest path the file system takes (PATH_MAX less its terminating
+// NUL); a longer name is not looked for.
+constexpr std::size_t kLongestPath = 4095;
 
 bool fail(Error* error, std::string message) {
-  setError(error, std::string(kPointFileErrorDomain), kPointFileErrorCode, std::move(message));
+  setError(error, std::string(kApplicationErrorDomain), kPointFileErrorCode, std::move(message));
   return true;
 }
 
-// The lines of the photograph list, split at every CR and every LF (so a
-// CR LF pair leaves an empty line between two); none when the file is
-// missing or cannot be read. The bytes are taken as they are: file names
-// are bytes here.
-std::optional<std::vector<std::string>> readPhotographList(const std::filesystem::path& file) {
-  const auto in = FileInputStream::open(file, nullptr);
-  if (!in) {
-    return std::nullopt;
-  }
-  std::string text(static_cast<std::size_t>(in->size()), '\0');
-  if (!in->read(text.data(), text.size())) {
-    return std::nullopt;
-  }
-  std::vector<std::string> lines(1);
-  for (const char c : text) {
-    if (c == '\r' || c == '\n') {
-      lines.emplace_back();
-    } else {
-      lines.back() += c;
+// The lines of the photograph list, handed out one at a time in file order.
+// Lines end at every CR and every LF (so a CR LF pair leaves an empty line
+// between two). The bytes are taken as they are: file names are bytes here.
+// Only the text is held, so a list of many short lines costs no more memory
+// than its size.
+class PhotographList {
+ public:
+  // The list in `file`; empty (no lines at all) when the file is missing or
+  // cannot be read.
+  explicit PhotographList(const std::filesystem::path& file) {
+    const auto in = FileInputStream::open(file, nullptr);
+    if (!in) {
+      return;
     }
+    text_.resize(static_cast<std::size_t>(in->size()));
+    if (!in->read(text_.data(), text_.size())) {
+      return;
+    }
+    next_ = 0;
   }
-  return lines;
+
+  // The next line; nothing once every line has been handed out. A text of
+  // n line ends has n + 1 lines, the last empty when the text ends with one.
+  std::optional<std::string_view> nextLine() {
+    if (next_ > text_.size()) {
+      return std::nullopt;
+    }
+    const std::string_view rest = std::string_view(text_).substr(next_);
+    const std::size_t end = std::min(rest.find_first_of("\r\n"), rest.size());
+    next_ += end + 1;
+    return rest.substr(0, end);
+  }
+
+ private:
+  std::string text_;
+  // Where the next line starts; past the end when there is none (or no list).
+  std::size_t next_ = std::string::npos;
+};
+
+bool namesAFile(const std::filesystem::path& path) {
+  std::error_code ignored;
+  return std::filesystem::is_regular_file(path, ignored);
 }
 
 // A line's photograph: its text up to the first space, relative to the
 // reconstruction's root folder (a leading "/" is joined, not taken as the
-// root of the file system). Empty when the line names nothing.
-std::filesystem::path photographOf(const std::filesystem::path& root, const std::string& line) {
-  const std::filesystem::path name(line.substr(0, line.find(' ')));
-  return name.empty() ? std::filesystem::path() : root / name.relative_path();
+// root of the file system). A list written on another machine names that
+// machine's paths ("/home/x/proj/images/a.jpg"), so when the joined path
+// names no file, the longest trailing part of the name that names a file
+// under the root is taken ("images/a.jpg", else "a.jpg"); when none does,
+// the joined path stands (and gives no photograph). Empty when the line
+// names nothing.
+std::filesystem::path photographOf(const std::filesystem::path& root, std::string_view line) {
+  const std::string_view entry = line.substr(0, line.find(' '));
+  if (entry.empty()) {
+    return {};
+  }
+  const std::filesystem::path name = std::filesystem::path(entry).relative_path();
+  const std::filesystem::path joined = root / name;
+  if (namesAFile(joined)) {
+    return joined;
+  }
+  std::string_view rest = name.native();
+  for (std::size_t slash = rest.find('/'); slash != std::string_view::npos;
+       slash = rest.find('/')) {
+    rest.remove_prefix(slash + 1);
+    // An empty part, or one too long for any path, names nothing; the
+    // shorter parts after it are still tried.
+    if (rest.empty() || rest.front() == '/' || rest.size() + root.native().size() >= kLongestPath) {
+      continue;
+    }
+    std::filesystem::path trailing = root / rest;
+    if (namesAFile(trailing)) {
+      return trailing;
+    }
+  }
+  return joined;
 }
 
 std::int64_t clampedToInt32(std::int64_t v) {
@@ -77,7 +135,7 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
   // The reconstruction's root holds "list.txt"; the bundle file sits one
   // folder below it (root/bundle/bundle.out).
   const std::filesystem::path root = removingLastPathComponents(absolutePath(url), 2);
-  const auto photographs = readPhotographList(root / "list.txt");
+  PhotographList photographs(root / "list.txt");
 
   const auto in = FileInputStream::open(url, nullptr);
   if (!in) {
@@ -91,18 +149,34 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
   std::int64_t pointCount = 0;
   (void)scanner.scan(cameraCount);
   (void)scanner.scan(pointCount);
-  cameraCount = clampedToInt32(cameraCount);
+  // A camera is a placed object of a few kilobytes, while its record can be
+  // as short as 30 bytes, so a file of zeros under a huge count would claim
+  // some eighty times its size in cameras. No real reconstruction has a
+  // camera for every 256 bytes of its file (its points alone take far
+  // more), so a larger count is refused, unless it is one any file may
+  // claim. The cameras then cost at most about ten times the file's size.
+  const std::uint64_t plausibleCameras =
+      std::max<std::uint64_t>(kCamerasAnyFileMayClaim, in->size() / kFileBytesPerCamera);
+  if (cameraCount > 0 && static_cast<std::uint64_t>(cameraCount) > plausibleCameras) {
+    return fail(error, "The file claims " + std::to_string(cameraCount) +
+                           " cameras, more than a reconstruction of " +
+                           std::to_string(in->size()) + " bytes has");
+  }
+  // The rest of the file cannot begin more cameras than this, counting one
+  // it only begins, so an absurd count costs nothing. A scan consumes text,
+  // so the reading also stops where the file ends.
+  const std::uint64_t camerasBegun =
+      (scanner.remainingBytes() + kSmallestCameraRecord - 1) / kSmallestCameraRecord;
+  cameraCount = static_cast<std::int64_t>(
+      std::min(static_cast<std::uint64_t>(clampedToInt32(cameraCount)), camerasBegun));
   pointCount = clampedToInt32(pointCount);
 
-  // Every scan consumes text, so this stops at the file's end however large
-  // the count.
   auto field = std::make_shared<CameraField>();
   std::int32_t made = 0;
   for (; made < cameraCount && !scanner.atEnd(); ++made) {
     auto camera = BundlerCamera::initWithFileHandleFileIndex(scanner, made);
-    if (photographs && static_cast<std::size_t>(made) < photographs->size()) {
-      if (auto photograph = photographOf(root, (*photographs)[static_cast<std::size_t>(made)]);
-          !photograph.empty()) {
+    if (const auto line = photographs.nextLine()) {
+      if (auto photograph = photographOf(root, *line); !photograph.empty()) {
         camera->setImagePath(photograph);
       }
     }
@@ -136,9 +210,10 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
     for (std::int64_t& v : rgb) {
       (void)scanner.scan(v);
     }
-    // The rest of the colour line, then the view list.
-    (void)scanner.readLine();
-    (void)scanner.readLine();
+    // The rest of the colour line, then the view list, each whole however
+    // long: a point seen by many cameras has a long view list.
+    (void)scanner.skipLine();
+    (void)scanner.skipLine();
 
     std::uint8_t* record = records + static_cast<std::size_t>(read) * stride;
     std::memcpy(record, xyz.data(), sizeof xyz);

@@ -4,13 +4,18 @@
 // records, and every camera of the file becomes a BundlerCamera in a
 // CameraField, the layer's first child, which the import also hands to the
 // document as a camera path. Each camera gets its photograph from the
-// reconstruction's "list.txt" when there is one.
+// reconstruction's "list.txt" when there is one: line i names camera i's
+// photograph, relative to the reconstruction's root folder. A name that
+// names no file there, as a list written on another machine holds that
+// machine's paths, falls back to the longest trailing part of it that names
+// a file under the root ("/home/x/proj/images/a.jpg" finds
+// root/images/a.jpg, else root/a.jpg).
 //
 // The file:
 //   # any comment line
 //   <cameras> <points>
 //   <cameras> records of five lines (see BundlerCamera)
-//   <points> records: "x y z", "r g b", and a view-list line (ignored)
+//   <points> records: "x y z", "r g b", and a view-list line (skipped)
 //
 // The layer is never written back to its file.
 
@@ -47,20 +52,26 @@ class BundlerFile : public PointLayer {
   const std::vector<std::shared_ptr<Camera>>& cameras() const { return cameras_; }
 
   // Reads the bundle file at `url`, answering by the point file's inverted
-  // convention (YES on failure) with the error in the application's point
-  // file domain, code 100: "Cannot open file", "File corrupt: short read"
-  // (not even a first line), "Cannot allocate point array" (the cameras
-  // already read stay as the child field).
+  // convention (YES on failure) with the error in the application's own
+  // domain (kApplicationErrorDomain, on purpose not the point file's),
+  // code 100: "Cannot open file", "File corrupt: short read" (not even a
+  // first line), "The file claims N cameras, more than a reconstruction of
+  // B bytes has" (more than 4096 cameras and more than one for every 256
+  // bytes of the file: a camera object takes kilobytes, so such a count
+  // could claim many times the file's size; nothing is made), "Cannot
+  // allocate point array" (the cameras already read stay as the child
+  // field).
   //
   // A file that ends early is not an error: the layer holds the cameras and
   // points the file begins, a record cut short reading 0 for what it
   // lacks, so ncameras and nPoints can be below the header's counts. A
-  // negative count reads as 0, and the point array is never larger than the
-  // rest of the file could fill (11 bytes a point at the least), so an
-  // absurd header claims no memory. Cameras beyond the lines of "list.txt"
-  // get no photograph. A view list longer than 511 characters is not
-  // consumed whole and the reading goes out of step from there on, as it
-  // always has.
+  // negative count reads as 0, and neither the cameras nor the point array
+  // are ever more than the rest of the file could fill (29 bytes a camera,
+  // 11 a point at the least), so an absurd header claims no memory. Cameras
+  // beyond the lines of "list.txt" get no photograph. A view list is
+  // skipped whole however long it is, so the points after it stay in step;
+  // a reading that took at most 511 characters of it, as the format's first
+  // reader did, went out of step after a long one.
   bool loadPointsFromURLError(const std::filesystem::path& url, Error* error) override;
   // Writes nothing and answers NO (success by the inverted convention).
   bool savePointsToURLError(const std::filesystem::path& url, Error* error) const override;

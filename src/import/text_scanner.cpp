@@ -68,6 +68,21 @@ bool TextScanner::readLine() {
   return taken > 0;
 }
 
+bool TextScanner::skipLine() {
+  bool taken = false;
+  while (fill()) {
+    const char* run = buffer_.data() + next_;
+    const auto* newline = static_cast<const char*>(std::memchr(run, '\n', end_ - next_));
+    taken = true;
+    if (newline != nullptr) {
+      next_ += static_cast<std::size_t>(newline - run) + 1;
+      return true;
+    }
+    next_ = end_;
+  }
+  return taken;
+}
+
 bool TextScanner::atEnd() {
   while (fill()) {
     while (next_ < end_ && isSpace(static_cast<unsigned char>(buffer_[next_]))) {

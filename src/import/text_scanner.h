@@ -2,7 +2,8 @@
 // Reads a text file the way the reconstruction formats are meant to be read
 // with fgets and scanf, but from a stream and with every read bounded: line
 // reads take at most 511 characters (a 512-byte line buffer), and numbers
-// are whitespace-separated fields.
+// are whitespace-separated fields. A line can also be skipped whole,
+// however long.
 //
 // Unlike scanf, a field is always consumed whole: its leading number is the
 // value ("12.5abc" reads as 12.5 for a float, 12 for an integer) and a field
@@ -27,6 +28,9 @@ class TextScanner {
   // characters (the rest of a longer line is left for the next read).
   // Answers NO when nothing was left to read.
   bool readLine();
+  // Consumes up to and including the next newline, however far it is (or
+  // to the end of the text). Answers NO when nothing was left to read.
+  bool skipLine();
 
   // The next field as a number. At the end of the text the target is left
   // as it is and the answer is NO; a field without a leading number stores

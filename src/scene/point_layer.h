@@ -46,6 +46,9 @@ static_assert(sizeof(color_point_with_normal) == 28);
 // what failed.
 inline constexpr std::string_view kPointFileErrorDomain = "myDomain";
 inline constexpr int kPointFileErrorCode = 100;
+// The application's own domain, which the importers' errors use (with the
+// point file's code), so they are told from the point file's.
+inline constexpr std::string_view kApplicationErrorDomain = "Cloudreel";
 
 // Zeroed record storage shared between a layer and its copies.
 class PointArray {

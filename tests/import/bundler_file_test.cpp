@@ -2,7 +2,11 @@
 
 #include <gtest/gtest.h>
 #include <stb/stb_image_write.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <array>
 #include <cstdint>
 #include <filesystem>
 #include <string>
@@ -72,6 +76,7 @@ TEST(BundlerFile, AReconstructionGivesItsPointsAndItsCamerasWithTheirPhotographs
 
 TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) {
   const testing::TempDir dir;
+  const std::string absurd = "#\n2000000000 0\n" + kCamera + points(1);
   const struct {
     std::string name;
     std::string text;  // none: no file at all
@@ -84,8 +89,11 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
       // The third camera is begun, so it is made; there are no points.
       {"cut in a camera", "#\n3 4\n" + kCamera + kCamera + "600 0 0\n", "", 3, 0},
       {"cut in a point", "#\n1 4\n" + kCamera + points(2) + "5 6", "", 1, 3},
-      // The points' text is read as the cameras the header promises.
-      {"absurd camera count", "#\n2000000000 0\n" + kCamera + points(1), "", 2, 0},
+      // No reconstruction has that many cameras in so few bytes.
+      {"absurd camera count", absurd,
+       "The file claims 2000000000 cameras, more than a reconstruction of " +
+           std::to_string(absurd.size()) + " bytes has",
+       0, 0},
       {"absurd point count", "#\n1 2000000000\n" + kCamera + points(1), "", 1, 1},
       {"negative counts", "#\n-3 -1\n" + kCamera + points(1), "", 0, 0},
       // The camera's text is read as points.
@@ -101,8 +109,8 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
     BundlerFile layer;
     Error error;
     EXPECT_EQ(layer.loadPointsFromURLError(url, &error), !c.error.empty());
-    EXPECT_EQ(error.message, c.error);
-    EXPECT_EQ(error.code, c.error.empty() ? 0 : 100);
+    // The application's own domain, not the point file's "myDomain".
+    EXPECT_EQ(error, (c.error.empty() ? Error{} : Error{"Cloudreel", 100, c.error}));
     EXPECT_EQ(fieldCameras(layer).size(), std::size_t(c.cameras));
     EXPECT_EQ(layer.ncameras(), c.cameras);
     EXPECT_EQ(layer.nPoints(), c.points);
@@ -111,6 +119,138 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
       EXPECT_LE(layer.pointArray()->size(), 16 * c.text.size() / 11);
     }
   }
+}
+
+// A point seen by many cameras has a long view list; the rest of a colour
+// line may be long too. Both are skipped whole, wherever the reading's
+// buffer ends, so the points after them are read in step.
+TEST(BundlerFile, LongViewListsAreSkippedWhole) {
+  const testing::TempDir dir;
+  for (const std::size_t length : {511u, 512u, 5000u, 200000u}) {
+    SCOPED_TRACE(length);
+    std::string views;
+    while (views.size() < length) views += "2 0 12 3.5 -1 ";
+    views.resize(length);
+    const std::string tail(length, 'x');
+    const auto url = writeFile(dir / "views.out", "#\n0 3\n1 2 3\n4 5 6\n" + views + "\n7 8 9\n" +
+                                                      "10 11 12 " + tail + "\n" + views +
+                                                      "\n13 14 15\n16 17 18\n" + views + "\n");
+    BundlerFile layer;
+    ASSERT_FALSE(layer.loadPointsFromURLError(url, nullptr));
+    std::vector<std::array<int, 4>> points;
+    for (const color_point& p : layer.colorPoints()) points.push_back({int(p.x), p.r, p.g, p.b});
+    EXPECT_EQ(points,
+              (std::vector<std::array<int, 4>>{{1, 4, 5, 6}, {7, 10, 11, 12}, {13, 16, 17, 18}}));
+  }
+}
+
+// Camera i takes line i of list.txt. A name that is no file under the root
+// (a path of the machine the list was written on) falls back to its longest
+// trailing part that is one; a name that is one keeps it.
+TEST(BundlerFile, PhotographsNamedByAnotherMachinesPathsAreFoundUnderTheRoot) {
+  const testing::TempDir root;
+  std::filesystem::create_directories(root / "images/sub.png");
+  const std::vector<std::uint8_t> grey(5 * 2, 99);
+  for (const auto& [name, width] : {std::pair{"images/a.png", 2}, {"a.png", 3}, {"b.png", 4}}) {
+    ASSERT_NE(stbi_write_png((root / name).c_str(), width, 2, 1, grey.data(), width), 0);
+  }
+  const struct {
+    std::string line;
+    int width;  // 0: no photograph
+  } cases[] = {
+      {"images/a.png 0 1234.5", 2},
+      {"/images/a.png", 2},
+      {"a.png", 3},
+      {"/home/x/proj/images/a.png 0 1234.5", 2},
+      {"C:/data/images/a.png", 2},
+      {"/home/x//proj/other/b.png", 4},
+      {"/home/x/proj/images/missing.png", 0},
+      {"/home/x/proj/images/sub.png", 0},
+      {"/home/x/proj/images/", 0},
+      {"", 0},
+  };
+  std::string list, cameras;
+  for (const auto& c : cases) {
+    list += c.line + "\n";
+    cameras += kCamera;
+  }
+  writeFile(root / "list.txt", list);
+  const auto url = writeFile(root / "bundle/bundle.out",
+                             "#\n" + std::to_string(std::size(cases)) + " 0\n" + cameras);
+  const auto layer = BundlerFile::initWithURLShouldLink(url, false);
+  ASSERT_TRUE(layer);
+  const auto made = fieldCameras(*layer);
+  ASSERT_EQ(made.size(), std::size(cases));
+  for (std::size_t i = 0; i < made.size(); ++i) {
+    const auto& camera = dynamic_cast<const BundlerCamera&>(*made[i]);
+    EXPECT_EQ(camera.imageWidth(), cases[i].width) << cases[i].line;
+    EXPECT_EQ(camera.hasImage(), cases[i].width > 0) << cases[i].line;
+  }
+}
+
+// What importing `url` in a child process costs: the growth of its peak
+// resident memory in bytes, and the cameras it made.
+struct ImportCost {
+  long long peakGrowth = -1;
+  long long cameras = -1;
+};
+
+ImportCost importInAChild(const std::filesystem::path& url) {
+  int out[2];
+  if (::pipe(out) != 0) return {};
+  const pid_t child = ::fork();
+  if (child == 0) {
+    ::close(out[0]);
+    rusage before{}, after{};
+    ::getrusage(RUSAGE_SELF, &before);
+    BundlerFile layer;
+    (void)layer.loadPointsFromURLError(url, nullptr);
+    ::getrusage(RUSAGE_SELF, &after);
+    // ru_maxrss counts kibibytes.
+    const ImportCost cost{(after.ru_maxrss - before.ru_maxrss) * 1024LL, layer.ncameras()};
+    const bool sent = ::write(out[1], &cost, sizeof cost) == ssize_t(sizeof cost);
+    ::_exit(sent ? 0 : 1);
+  }
+  ::close(out[1]);
+  ImportCost cost;
+  if (child < 0 || ::read(out[0], &cost, sizeof cost) != ssize_t(sizeof cost)) cost = {};
+  ::close(out[0]);
+  int status = 0;
+  if (child > 0) ::waitpid(child, &status, 0);
+  return cost;
+}
+
+// A camera is a placed object of some 2.3 KB (its transforms and their
+// observation, mostly) and every 30 bytes of zeros begin one. A count no
+// real reconstruction of the file's size has is refused before anything is
+// made; the largest count a file may claim costs about ten times its size.
+// The photograph list is held as its text, whatever its lines.
+TEST(BundlerFile, AHostileFileOrListClaimsMemoryOnlyInProportionToItsSize) {
+  const testing::TempDir root;
+  std::string zeros;
+  for (int i = 0; i < 450000; ++i) zeros += "0 ";
+  const auto bundle = writeFile(root / "bundle/bundle.out", "#\n2000000000 0\n" + zeros);
+  BundlerFile refused;
+  Error error;
+  EXPECT_TRUE(refused.loadPointsFromURLError(bundle, &error));
+  EXPECT_EQ(error.message, "The file claims 2000000000 cameras, more than a reconstruction of " +
+                               std::to_string(zeros.size() + 15) + " bytes has");
+  EXPECT_EQ(refused.childLayerCount(), 0);
+#if defined(__SANITIZE_ADDRESS__)
+  GTEST_SKIP() << "resident memory is not the program's own under AddressSanitizer";
+#endif
+  const std::string header = "#\n3500 0\n";
+  writeFile(bundle, header + zeros);
+  const ImportCost cameras = importInAChild(bundle);
+  EXPECT_EQ(cameras.cameras, 3500);
+  EXPECT_LE(cameras.peakGrowth, 12 * static_cast<long long>(header.size() + zeros.size()));
+
+  const std::string list(8 << 20, '\n');
+  writeFile(root / "list.txt", list);
+  writeFile(bundle, header + zeros.substr(0, 30 * 100));
+  const ImportCost photographs = importInAChild(bundle);
+  EXPECT_EQ(photographs.cameras, 100);
+  EXPECT_LE(photographs.peakGrowth, 4 * static_cast<long long>(list.size()));
 }
 
 TEST(BundlerFile, ALinkedLayerIsReadFromItsFileAgainWhenDecoded) {
