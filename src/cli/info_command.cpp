@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <nlohmann/json.hpp>
 
+#include "cli/json_output.h"
 #include "cli/point_cloud_input.h"
 #include "cli/point_cloud_summary.h"
 #include "scene/point_layer.h"
@@ -30,7 +31,9 @@ nlohmann::ordered_json toJson(const std::string& file, const PointCloudSummary& 
       elements.push_back(
           {{"name", element.name}, {"count", element.count}, {"properties", properties}});
     }
-    json["ply"] = {{"format", summary.ply->format}, {"elements", elements}};
+    json["ply"] = {{"format", summary.ply->format},
+                   {"elements", elements},
+                   {"hasColor", summary.ply->hasColor}};
   }
   if (summary.bundle) {
     json["bundle"] = {{"cameras", summary.bundle->cameras}, {"points", summary.bundle->points}};
@@ -80,6 +83,9 @@ std::string toText(const std::string& file, const PointCloudSummary& summary) {
         text += fmt::format("    property {} {}\n", property.type, property.name);
       }
     }
+    if (!summary.ply->hasColor) {
+      text += "  no colour: points are white\n";
+    }
   }
   if (summary.bundle) {
     text += fmt::format("bundle header: {} cameras, {} points\n", summary.bundle->cameras,
@@ -112,8 +118,9 @@ CLI::App* addInfoCommand(CLI::App& app, InfoOptions& options) {
       "The JSON object has \"file\", \"points\", \"faces\", \"hasNormals\" (28-byte records with "
       "normals), \"bbox\" ([minX, minY, minZ, maxX, maxY, maxZ]) and \"luckHistogram\" (256 "
       "counts of records by luck value); for a PLY file also \"ply\": {\"format\", \"elements\": "
-      "[{\"name\", \"count\", \"properties\": [{\"name\", \"type\"}]}]}, where a list property's "
-      "type reads \"list <length type> <value type>\", e.g. \"list uchar int\"; for a bundle "
+      "[{\"name\", \"count\", \"properties\": [{\"name\", \"type\"}]}], \"hasColor\"}, where a "
+      "list property's type reads \"list <length type> <value type>\", e.g. \"list uchar int\", "
+      "and \"hasColor\" is false when the vertices have no colour (imported white); for a bundle "
       "file also \"bundle\": {\"cameras\", \"points\"} (the counts its header claims) and "
       "\"cameras\": [{\"index\", \"focal\", \"k1\", \"k2\", \"centre\" ([x, y, z]), "
       "\"fieldOfView\" (degrees, from the photograph's width), \"image\": {\"width\", "
@@ -167,7 +174,7 @@ int runInfoCommand(const InfoOptions& options) {
   summary.bundle = bundle;
 
   const std::string out =
-      options.json ? toJson(options.file, summary).dump() + "\n" : toText(options.file, summary);
+      options.json ? jsonText(toJson(options.file, summary)) : toText(options.file, summary);
   if (std::fputs(out.c_str(), stdout) < 0 || std::fflush(stdout) != 0) {
     reportFailure("cannot write to standard output");
     return 1;

@@ -138,6 +138,41 @@ TEST(CliInfo, DescribesPlyFilesInEveryFormatAsTheirImportedLayer) {
   EXPECT_NE(text.out.find("property list uchar int vertex_indices"), std::string::npos);
 }
 
+// A file whose vertices have no blue value imports as white points, and
+// info says so; red and green alone do not make a coloured file.
+TEST(CliInfo, SaysWhenAPlyFileHasNoColour) {
+  TempDir dir;
+  const PlyElement plain{"vertex",
+                         {{"float", "x"}, {"float", "y"}, {"float", "z"}, {"uchar", "red"}},
+                         {{1, 2, 3, 9}, {4, 5, 6, 9}}};
+  writeFile(dir / "plain.ply", plyText({plain}, "ascii"));
+  writeFile(dir / "cloud.ply", plyCloud(2, "ascii"));
+  for (const auto& [file, coloured] : {std::pair{"plain.ply", false}, {"cloud.ply", true}}) {
+    SCOPED_TRACE(file);
+    const nlohmann::json info = infoJson(dir, file);
+    EXPECT_EQ(info["points"], 2);
+    EXPECT_EQ(info["ply"]["hasColor"], coloured);
+    const Outcome text = cloudreel(dir, {"info", file});
+    EXPECT_EQ(text.out.find("no colour: points are white") == std::string::npos, coloured)
+        << text.out;
+  }
+}
+
+// Names are bytes: a file name or a PLY header name that is not UTF-8
+// still gives valid JSON, each bad byte replaced.
+TEST(CliInfo, WritesValidJsonForNamesThatAreNotUtf8) {
+  TempDir dir;
+  PlyElement vertex{"vertex", cloudreel::testing::kPlyXyzRgb, {{1, 2, 3, 4, 5, 6}}};
+  vertex.properties.push_back({"float", "qu\xe9lit\xe9"});
+  vertex.instances[0].push_back(0.5);
+  const std::string name = "bad\xff.ply";
+  writeFile(dir / name, plyText({vertex}, "ascii"));
+  const nlohmann::json info = infoJson(dir, name);
+  ASSERT_FALSE(info.is_discarded());
+  EXPECT_EQ(info["file"], "bad\xef\xbf\xbd.ply");
+  EXPECT_EQ(info["ply"]["elements"][0]["properties"][6]["name"], "qu\xef\xbf\xbdlit\xef\xbf\xbd");
+}
+
 // Point files of plain records are read back after a conversion below.
 TEST(CliInfo, DescribesAPointFileWithNormalsAndFaces) {
   TempDir dir;
