@@ -50,6 +50,11 @@ void UndoManager::registerUndoWithTarget(const void* target, Action action) {
 }
 
 void UndoManager::setActionName(std::string name) {
+  // A change made while registration is off registered nothing, so its name
+  // must not rename the step before it.
+  if (disabled_ > 0) {
+    return;
+  }
   if (!open_.empty()) {
     open_.front().actionName = std::move(name);
     return;

@@ -54,7 +54,7 @@ class UndoManager {
   // The front end calls this at the end of each user event.
   void closeEventGroup();
 
-  // While disabled (calls nest), registrations are ignored.
+  // While disabled (calls nest), registrations and action names are ignored.
   void disableUndoRegistration() { ++disabled_; }
   void enableUndoRegistration();
   bool isUndoRegistrationEnabled() const { return disabled_ == 0; }

@@ -9,6 +9,8 @@
 #include "camera/transform_stack.h"
 #include "platform/log.h"
 #include "platform/run_loop.h"
+#include "render/gl/egl_context.h"
+#include "render/render_options.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
 #include "timeline/timeline.h"
@@ -36,14 +38,20 @@ void gatherCameraPaths(const std::shared_ptr<Layer>& layer,
   ancestors.pop_back();
 }
 
+ApplicationDelegate* sharedDelegate = nullptr;
+
 }  // namespace
+
+ApplicationDelegate* ApplicationDelegate::shared() { return sharedDelegate; }
+void ApplicationDelegate::setShared(ApplicationDelegate* delegate) { sharedDelegate = delegate; }
 
 MyDocument::MyDocument()
     : sceneCamera_(SceneCamera::initWithZDistance(15.0)),
       lightSource_(std::make_shared<LightSource>()),
       undoManager_(&RunLoop::main()) {
   sceneCamera_->setName("Scene Camera");
-  timeline_ = std::make_shared<Timeline>();
+  setTimeline(std::make_shared<Timeline>());
+  initOpenGLContext();
   transformStacks_.push_back(std::make_shared<TransformStack>());
   NotificationCenter::defaultCenter().addObserver(
       *this, std::string(kGridColorChangedNotification), nullptr,
@@ -55,6 +63,14 @@ MyDocument::~MyDocument() {
   for (const auto& layer : layers_) {
     layer->removeObserversForDocument(this);
   }
+  if (timeline_) {
+    timeline_->setUndoManager(nullptr);
+  }
+}
+
+void MyDocument::close() {
+  NotificationCenter::defaultCenter().postNotificationName(std::string(kDocumentCloseNotification),
+                                                           this);
 }
 
 const PropertyTable& MyDocument::properties() const {
@@ -67,7 +83,33 @@ const PropertyTable& MyDocument::properties() const {
        property<MyDocument>("selectedCamera", &MyDocument::selectedCamera,
                             &MyDocument::setSelectedCamera),
        property<MyDocument>("enableViewUpdates", &MyDocument::enableViewUpdates,
-                            &MyDocument::setEnableViewUpdates)});
+                            &MyDocument::setEnableViewUpdates),
+       property<MyDocument>("timeline", &MyDocument::timeline, &MyDocument::setTimeline),
+       // Boxed: null stands for a setting the file did not hold.
+       Property{"overrideBuckets",
+                [](const Object& o) -> Value {
+                  const auto v = static_cast<const MyDocument&>(o).overrideBuckets();
+                  return v ? Value(*v) : Value{};
+                },
+                [](Object& o, const Value& v) {
+                  if (!isNull(v) && !isNumber(v)) {
+                    return false;
+                  }
+                  static_cast<MyDocument&>(o).setOverrideBuckets(numberAs<bool>(v));
+                  return true;
+                }},
+       Property{"bucketOverrideFraction",
+                [](const Object& o) -> Value {
+                  const auto v = static_cast<const MyDocument&>(o).bucketOverrideFraction();
+                  return v ? Value(*v) : Value{};
+                },
+                [](Object& o, const Value& v) {
+                  if (!isNull(v) && !isNumber(v)) {
+                    return false;
+                  }
+                  static_cast<MyDocument&>(o).setBucketOverrideFraction(numberAs<float>(v));
+                  return true;
+                }}});
   return table;
 }
 
@@ -262,6 +304,77 @@ void MyDocument::setSceneCamera(std::shared_ptr<SceneCamera> camera) {
 
 void MyDocument::setLightSource(std::shared_ptr<LightSource> light) {
   changeValueForKey("lightSource", lightSource_, std::move(light));
+}
+
+void MyDocument::setTimeline(std::shared_ptr<Timeline> timeline) {
+  if (timeline_) {
+    timeline_->setUndoManager(nullptr);
+  }
+  if (timeline) {
+    timeline->setUndoManager(&undoManager_);
+  }
+  changeValueForKey("timeline", timeline_, std::move(timeline));
+}
+
+void MyDocument::setViewBookmarks(std::optional<Bookmarks> bookmarks) {
+  willChangeValueForKey("viewBookmarks");
+  viewBookmarks_ = std::move(bookmarks);
+  didChangeValueForKey("viewBookmarks");
+}
+
+void MyDocument::setOverrideBuckets(std::optional<bool> v) {
+  willChangeValueForKey("overrideBuckets");
+  overrideBuckets_ = v;
+  didChangeValueForKey("overrideBuckets");
+}
+
+void MyDocument::setBucketOverrideFraction(std::optional<float> v) {
+  willChangeValueForKey("bucketOverrideFraction");
+  bucketOverrideFraction_ = v;
+  didChangeValueForKey("bucketOverrideFraction");
+}
+
+// --- drawing
+
+void MyDocument::drawContentWithOptions(const RenderOptions& options) {
+  lightSource_->setupLightSource();
+  lightSource_->drawContentWithOptions(options);
+  // Copies: drawing must not see the lists change under it.
+  const std::vector<std::shared_ptr<Layer>> layers = layers_;
+  for (const auto& layer : layers) {
+    layer->drawContentWithOptions(options);
+  }
+  if (options.isYes(kRenderOptionEditor)) {
+    const std::vector<std::shared_ptr<TransformStack>> stacks = transformStacks_;
+    for (const auto& stack : stacks) {
+      stack->drawContentWithOptions(options);
+    }
+  }
+}
+
+std::shared_ptr<gl::GLContext> MyDocument::sharedGLContext() {
+  if (!sharedGLContext_ && contextWanted_) {
+    contextWanted_ = false;
+    // A headless context draws only into framebuffer objects, which carry
+    // their own 32-bit depth buffers, so the context itself asks for no
+    // pixel format.
+    Error error;
+    sharedGLContext_ = gl::EglContext::createHeadless(&error);
+    if (!sharedGLContext_) {
+      logf("cannot make the document's OpenGL context: %s", error.message);
+    }
+  }
+  return sharedGLContext_;
+}
+
+void MyDocument::setSharedGLContext(std::shared_ptr<gl::GLContext> context) {
+  sharedGLContext_ = std::move(context);
+  contextWanted_ = false;
+}
+
+void MyDocument::initOpenGLContext() {
+  sharedGLContext_.reset();
+  contextWanted_ = true;
 }
 
 // --- generic undoable property changes

@@ -10,16 +10,30 @@
 // with the undo action name as context, and registers "set the old value
 // back" when one changes. Structural edits register their inverse.
 
+#include <filesystem>
+#include <functional>
+#include <map>
 #include <memory>
+#include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "platform/byte_stream.h"
+#include "platform/error.h"
 #include "platform/notification_center.h"
 #include "platform/object.h"
 #include "platform/undo_manager.h"
 
 namespace cloudreel {
+
+namespace gl {
+class GLContext;
+}
+class InputStream;
+class OutputStream;
+class RenderOptions;
 
 class Camera;
 class CameraPath;
@@ -32,7 +46,30 @@ class TransformStack;
 
 inline constexpr std::string_view kDocumentChangeNotification =
     "KTPointDocument_DocumentChangeNotification";
+inline constexpr std::string_view kDocumentCloseNotification =
+    "KTPointDocument_DocumentCloseNotification";
 inline constexpr std::string_view kGridColorChangedNotification = "KTGridColorChanged";
+
+// The document file's extension.
+inline constexpr std::string_view kDocumentExtension = "reel";
+// A document that cannot be read: the operating system's status domain and
+// its code for corrupt data, with the reason "The document is corrupt".
+inline constexpr std::string_view kDocumentErrorDomain = "NSOSStatusErrorDomain";
+inline constexpr int kDocumentCorruptCode = -4;
+inline constexpr std::string_view kDocumentCorruptMessage = "The document is corrupt";
+
+// The application object a document tells which layer became current (the
+// one a new or opened document starts with). The application installs one;
+// without it nobody is told.
+class ApplicationDelegate {
+ public:
+  virtual ~ApplicationDelegate() = default;
+  virtual void setCurrentLayer(const std::shared_ptr<Layer>& layer) = 0;
+
+  static ApplicationDelegate* shared();
+  // Not owned; null removes it.
+  static void setShared(ApplicationDelegate* delegate);
+};
 
 // A view that shows a document and redraws when told to.
 class DocumentView {
@@ -52,9 +89,9 @@ class MyDocument : public Object, public Observer {
  public:
   // No layers and no stored camera paths; one new transform stack; a scene
   // camera 15 units along +z named "Scene Camera"; a new light; view
-  // updates on.
+  // updates on; bucket override on at 0.1.
   MyDocument();
-  // Detaches every top-level layer.
+  // Detaches every top-level layer and stops receiving notifications.
   ~MyDocument() override;
 
   std::string_view className() const override { return "MyDocument"; }
@@ -125,8 +162,63 @@ class MyDocument : public Object, public Observer {
   // A plain store.
   void setTransformStacks(std::vector<std::shared_ptr<TransformStack>> stacks);
 
-  // --- the animation: a new document's timeline holds the ruler alone.
+  // --- the animation: a new document's timeline holds the ruler alone. A
+  // document read from a file without one has none (null). Applying the
+  // timeline registers no undo: animation is not an edit.
   const std::shared_ptr<Timeline>& timeline() const { return timeline_; }
+  void setTimeline(std::shared_ptr<Timeline> timeline);
+
+  // --- view bookmarks: copies of the scene camera under the bookmark menu
+  // item's title. Null in a document read from a file without them; every
+  // user treats null as empty.
+  using Bookmarks = std::map<std::string, std::shared_ptr<SceneCamera>>;
+  const std::optional<Bookmarks>& viewBookmarks() const { return viewBookmarks_; }
+  void setViewBookmarks(std::optional<Bookmarks> bookmarks);
+
+  // --- the document-wide bucket settings, boxed as the file holds them:
+  // null in files written before they existed, which means no override and
+  // a fraction of 0.0 wherever they are used.
+  std::optional<bool> overrideBuckets() const { return overrideBuckets_; }
+  void setOverrideBuckets(std::optional<bool> v);
+  std::optional<float> bucketOverrideFraction() const { return bucketOverrideFraction_; }
+  void setBucketOverrideFraction(std::optional<float> v);
+
+  // --- drawing
+  // The scene's root: the light, every top-level layer (each decides by its
+  // own visibility), and in editor frames only the transform stacks.
+  void drawContentWithOptions(const RenderOptions& options);
+  // The context every view and off-screen renderer of this document shares.
+  // initOpenGLContext replaces it with a new headless one (a context in a
+  // share group of its own), made when first asked for, so a document that
+  // is never drawn never starts a GL driver. A front end with contexts of
+  // its own hands one in with setSharedGLContext. Null when no context can
+  // be had (logged).
+  std::shared_ptr<gl::GLContext> sharedGLContext();
+  void setSharedGLContext(std::shared_ptr<gl::GLContext> context);
+  void initOpenGLContext();
+
+  // --- the document file
+  // Posts the close notification; the front end then closes the windows.
+  void close();
+  // The archive of the whole scene (the type is not consulted). Modified
+  // top-level point layers linked to a point file write it back first; a
+  // failure there is presented by the layer and does not stop the save.
+  // Empty, with the error, only when the archive itself cannot be made.
+  Bytes dataOfTypeError(std::string_view type, Error* error);
+  // Replaces the document's contents by those of the archive. Bytes that are
+  // not a document give NO and "The document is corrupt" (code -4); a
+  // linked point file that cannot be found gives NO and the point file's
+  // error naming the file. Either way nothing of the document changes.
+  bool readFromDataOfTypeError(std::span<const std::uint8_t> data, std::string_view type,
+                               Error* error);
+  // The same from and to a file on disk. Writing streams the archive into a
+  // temporary beside the file, flushes it to the disk and renames it over
+  // the file (through a symbolic link, onto the file it names), so a save
+  // that fails for any reason reports why and leaves the previous file as it
+  // was. Point records go between the layers' arrays and the file with no
+  // copy of the whole archive in memory.
+  bool writeToURLError(const std::filesystem::path& url, Error* error);
+  bool readFromURLError(const std::filesystem::path& url, Error* error);
 
   // --- selection (not owned)
   std::shared_ptr<Layer> selectedLayer() const { return selectedLayer_.lock(); }
@@ -169,6 +261,8 @@ class MyDocument : public Object, public Observer {
 
  private:
   void reloadOutline();
+  bool writeToStream(OutputStream& out, Error* error);
+  bool readFromStream(InputStream& in, Error* error);
 
   std::vector<std::shared_ptr<Layer>> layers_;
   std::vector<std::shared_ptr<CameraPath>> cameraPaths_;
@@ -178,6 +272,11 @@ class MyDocument : public Object, public Observer {
   std::weak_ptr<Layer> selectedLayer_;
   std::weak_ptr<Camera> selectedCamera_;
   std::shared_ptr<LightSource> lightSource_;
+  std::optional<Bookmarks> viewBookmarks_ = Bookmarks{};
+  std::optional<bool> overrideBuckets_ = true;
+  std::optional<float> bucketOverrideFraction_ = 0.1f;
+  std::shared_ptr<gl::GLContext> sharedGLContext_;
+  bool contextWanted_ = false;
   std::vector<DocumentView*> views_;
   DocumentView* playbackView_ = nullptr;
   LayerOutline* outlineView_ = nullptr;

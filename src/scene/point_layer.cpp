@@ -362,6 +362,8 @@ void PointLayer::initWithCoder(KeyedUnarchiver& coder) {
     Error error;
     (void)loadPointsFromURLError(originalURL_, &error);
     if (!error.message.empty()) {
+      // Said with the file's name: the document being opened only names it.
+      error.message += ": " + originalURL_.string();
       UserInteraction::shared().presentError(error);
       coder.failWithError(error);
     }

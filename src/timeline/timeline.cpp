@@ -5,6 +5,7 @@
 #include "platform/keyed_archiver.h"
 #include "platform/keyed_unarchiver.h"
 #include "platform/log.h"
+#include "platform/undo_manager.h"
 #include "timeline/edit_point.h"
 #include "timeline/timeline_clip.h"
 #include "timeline/timeline_track.h"
@@ -69,8 +70,14 @@ void Timeline::removeObjectFromTracksAtIndex(int index) {
 }
 
 void Timeline::applyForTime(float t) {
+  if (undoManager_ != nullptr) {
+    undoManager_->disableUndoRegistration();
+  }
   for (const auto& track : tracks_) {
     track->applyEffectForTime(t);
+  }
+  if (undoManager_ != nullptr) {
+    undoManager_->enableUndoRegistration();
   }
 }
 

@@ -22,6 +22,7 @@ class ClipInsertion;
 class EditPoint;
 class TimelineClip;
 class TimelineTrack;
+class UndoManager;
 
 class Timeline : public Object {
  public:
@@ -52,8 +53,14 @@ class Timeline : public Object {
   void removeTrack(const TimelineTrack& track);
   void removeObjectFromTracksAtIndex(int index);
 
-  // Every track, in list order, applies its value for t.
+  // Every track, in list order, applies its value for t. Animation is not an
+  // edit: undo registration on the owner's undo manager is off meanwhile,
+  // so moving the cursor, playing or rendering leaves the undo history as
+  // it was, while the values still reach every observer.
   void applyForTime(float t);
+  // The undo manager of the document that owns this timeline (not owned;
+  // null for none).
+  void setUndoManager(UndoManager* manager) { undoManager_ = manager; }
   // The longest track, but never less than one second.
   float totalLengthInSeconds() const;
   // fps × totalLengthInSeconds, truncated toward zero (saturating).
@@ -116,6 +123,7 @@ class Timeline : public Object {
   std::int32_t fps_ = 25;
   float inPoint_ = -1.0f;
   float outPoint_ = -1.0f;
+  UndoManager* undoManager_ = nullptr;
 };
 
 }  // namespace cloudreel

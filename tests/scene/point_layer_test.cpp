@@ -208,7 +208,8 @@ TEST_F(PointLayerTest, InlineLayersTravelInTheArchiveLinkedOnesReloadTheirFile) 
   std::filesystem::remove(dir / "linked.rwb");
   Error error;
   EXPECT_FALSE(KeyedUnarchiver::unarchiveObjectWithData(archive, &error));
-  EXPECT_EQ(user->errors.back().message, "Cannot open file");
+  EXPECT_EQ(user->errors.back().message, "Cannot open file: " + (dir / "linked.rwb").string());
+  EXPECT_EQ(error.message, user->errors.back().message);
 }
 
 TEST_F(PointLayerTest, OlderDocumentsAndDamagedCountsReadSafely) {
