@@ -122,7 +122,7 @@ void SourceCamera::uploadOpenGLTexture() {
   if (!photo.pixels) {
     // Logged once: from now on the camera has no photograph to decode.
     const char* reason = stbi_failure_reason();
-    logf("cannot decode photograph %s: %s", photographFile_.string(),
+    logWarningf("cannot decode photograph %s: %s", photographFile_.string(),
          reason != nullptr ? reason : "unknown reason");
     decodeFailed_ = true;
     imageWidth_ = 0;

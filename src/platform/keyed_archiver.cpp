@@ -253,7 +253,7 @@ Bytes KeyedArchiver::archivedDataWithRootObject(const ObjectPtr& root) {
   archiver.encodeObject(root, "root");
   Error error;
   if (!archiver.finish(&error)) {
-    logf("archiving failed: %s", error.message);
+    logWarningf("archiving failed: %s", error.message);
     return {};
   }
   return out.takeBytes();

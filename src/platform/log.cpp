@@ -1,5 +1,6 @@
 #include "platform/log.h"
 
+#include <atomic>
 #include <cstdio>
 #include <mutex>
 
@@ -18,7 +19,15 @@ LogSink& currentSink() {
   return sink;
 }
 
+std::atomic<LogLevel>& threshold() {
+  static std::atomic<LogLevel> level{LogLevel::Debug};
+  return level;
+}
+
 }  // namespace
+
+void setLogThreshold(LogLevel level) { threshold() = level; }
+LogLevel logThreshold() { return threshold(); }
 
 LogSink setLogSink(LogSink sink) {
   std::lock_guard lock(sinkMutex());
@@ -27,10 +36,13 @@ LogSink setLogSink(LogSink sink) {
   return previous;
 }
 
-void logMessage(std::string_view message) {
+void logMessage(std::string_view message, LogLevel level) {
   std::lock_guard lock(sinkMutex());
   if (currentSink()) {
     currentSink()(message);
+    return;
+  }
+  if (level < threshold()) {
     return;
   }
   std::fwrite(message.data(), 1, message.size(), stderr);

@@ -122,7 +122,7 @@ UserDefaults::UserDefaults(std::unique_ptr<DefaultsStore> store) : store_(std::m
   Error error;
   user_ = store_->load(&error);
   if (!error.message.empty()) {
-    logf("user defaults could not be read, starting from the registered values: %s",
+    logWarningf("user defaults could not be read, starting from the registered values: %s",
          error.message);
   }
 }
@@ -206,7 +206,7 @@ void UserDefaults::removeObjectForKey(std::string_view key) {
 void UserDefaults::save() {
   Error error;
   if (!store_->save(user_, &error)) {
-    logf("user defaults could not be saved: %s", error.message);
+    logWarningf("user defaults could not be saved: %s", error.message);
   }
 }
 

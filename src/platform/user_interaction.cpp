@@ -24,14 +24,14 @@ std::shared_ptr<UserInteraction> UserInteraction::setShared(std::shared_ptr<User
 }
 
 void LoggingUserInteraction::presentError(const Error& error) {
-  logf("error: %s (%s %d)", error.message, error.domain, error.code);
+  logErrorf("error: %s (%s %d)", error.message, error.domain, error.code);
 }
 
 int LoggingUserInteraction::runAlert(const Alert& alert) {
   if (alert.informativeText.empty()) {
-    logf("%s", alert.messageText);
+    logWarningf("%s", alert.messageText);
   } else {
-    logf("%s: %s", alert.messageText, alert.informativeText);
+    logWarningf("%s: %s", alert.messageText, alert.informativeText);
   }
   return 0;
 }

@@ -81,7 +81,7 @@ bool LuckOrderedPoints::upload(const Source& source) {
   }
   auto* out = static_cast<std::uint8_t*>(buffer_.allocateAndMap(source.count * vertexSize));
   if (out == nullptr) {
-    logf("Cannot upload %zu points for drawing", source.count);
+    logWarningf("Cannot upload %zu points for drawing", source.count);
     return false;
   }
   std::array<std::size_t, 256> next{};
@@ -101,7 +101,7 @@ bool LuckOrderedPoints::upload(const Source& source) {
     }
   }
   if (!buffer_.unmap()) {
-    logf("Cannot upload %zu points for drawing", source.count);
+    logWarningf("Cannot upload %zu points for drawing", source.count);
     return false;
   }
   start_ = start;

@@ -361,7 +361,7 @@ std::shared_ptr<gl::GLContext> MyDocument::sharedGLContext() {
     Error error;
     sharedGLContext_ = gl::EglContext::createHeadless(&error);
     if (!sharedGLContext_) {
-      logf("cannot make the document's OpenGL context: %s", error.message);
+      logWarningf("cannot make the document's OpenGL context: %s", error.message);
     }
   }
   return sharedGLContext_;

@@ -330,7 +330,7 @@ void PointLayer::initWithCoder(KeyedUnarchiver& coder) {
     if (auto decoded = Color::colorFromArchivedData(color, &error)) {
       fixedColor_ = std::move(decoded);
     } else {
-      logf("point layer \"%s\": unreadable fixed colour (%s)", name(), error.message);
+      logWarningf("point layer \"%s\": unreadable fixed colour (%s)", name(), error.message);
     }
   }
   pointSize_ = coder.decodeFloatForKey("pointSize");
@@ -376,7 +376,7 @@ void PointLayer::initWithCoder(KeyedUnarchiver& coder) {
   const std::size_t wanted = nPoints_ > 0 ? static_cast<std::size_t>(nPoints_) : 0;
   const std::size_t count = std::min(wanted, blob / 16);
   if (count < wanted) {
-    logf("point layer \"%s\": %d points stored, %d announced", name(), static_cast<int>(count),
+    logWarningf("point layer \"%s\": %d points stored, %d announced", name(), static_cast<int>(count),
          static_cast<int>(wanted));
   }
   points_ = PointArray::allocate(count * 16);

@@ -211,7 +211,7 @@ void Sphere::initWithCoder(KeyedUnarchiver& coder) {
     Error error;
     color = Color::colorFromArchivedData(data, &error);
     if (!color) {
-      logf("primitive \"%s\": unreadable colour (%s); using white", name(), error.message);
+      logWarningf("primitive \"%s\": unreadable colour (%s); using white", name(), error.message);
     }
   }
   color_ = color ? std::move(color) : white();

@@ -136,7 +136,7 @@ CurrentContext::~CurrentContext() {
   if (previous_ != nullptr) {
     Error error;
     if (!previous_->makeCurrent(&error)) {
-      logf("could not make the previous OpenGL context current again: %s", error.message);
+      logWarningf("could not make the previous OpenGL context current again: %s", error.message);
     }
   } else {
     context_.doneCurrent();
