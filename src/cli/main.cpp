@@ -7,6 +7,7 @@
 
 #include "cli/convert_command.h"
 #include "cli/info_command.h"
+#include "platform/log.h"
 
 int main(int argc, char** argv) {
   CLI::App app{
@@ -16,6 +17,10 @@ int main(int argc, char** argv) {
   app.set_version_flag("--version", std::string("cloudreel ") + CLOUDREEL_VERSION);
   app.footer("Run 'cloudreel COMMAND --help' for the options of a command.");
   app.require_subcommand(0, 1);
+  bool verbose = false;
+  app.add_flag("--verbose", verbose,
+               "also show the diagnostic lines of the core on standard error (warnings and "
+               "errors are always shown)");
 
   cloudreel::cli::InfoOptions info;
   const CLI::App* infoCommand = cloudreel::cli::addInfoCommand(app, info);
@@ -23,6 +28,7 @@ int main(int argc, char** argv) {
   const CLI::App* convertCommand = cloudreel::cli::addConvertCommand(app, convert);
 
   CLI11_PARSE(app, argc, argv);
+  cloudreel::setLogThreshold(verbose ? cloudreel::LogLevel::Debug : cloudreel::LogLevel::Warning);
   if (infoCommand->parsed()) {
     return cloudreel::cli::runInfoCommand(info);
   }

@@ -185,6 +185,10 @@ TEST(CliInfo, DescribesAPointFileWithNormalsAndFaces) {
   EXPECT_EQ(info["luckHistogram"][1], 1);
   EXPECT_EQ(info["luckHistogram"][2], 2);
   EXPECT_FALSE(info.contains("ply"));
+  // Quiet by default: the core's diagnostics show only with --verbose.
+  EXPECT_EQ(cloudreel(dir, {"info", "NORMALS.RWB"}).err, "");
+  EXPECT_NE(cloudreel(dir, {"--verbose", "info", "NORMALS.RWB"}).err.find("deallocing point layer"),
+            std::string::npos);
 }
 
 TEST(CliInfo, DescribesABundleFileWithItsCamerasAndTheirPhotographs) {
