@@ -6,6 +6,8 @@
 #include <cstdio>
 #include <nlohmann/json.hpp>
 
+#include "cli/document_info.h"
+#include "cli/document_input.h"
 #include "cli/json_output.h"
 #include "cli/point_cloud_input.h"
 #include "cli/point_cloud_summary.h"
@@ -110,8 +112,11 @@ std::string toText(const std::string& file, const PointCloudSummary& summary) {
 
 CLI::App* addInfoCommand(CLI::App& app, InfoOptions& options) {
   CLI::App* command = app.add_subcommand(
-      "info", "Describe the point layer a .rwb, .ply or Bundler .out file opens as.");
-  command->add_option("FILE", options.file, "a .rwb point file, a .ply file or a Bundler .out file")
+      "info",
+      "Describe a .reel document, or the point layer a .rwb, .ply or Bundler .out file opens as.");
+  command
+      ->add_option("FILE", options.file,
+                   "a .reel document, a .rwb point file, a .ply file or a Bundler .out file")
       ->required();
   command->add_flag("--json", options.json, "print one JSON object instead of text");
   command->footer(
@@ -127,12 +132,27 @@ CLI::App* addInfoCommand(CLI::App& app, InfoOptions& options) {
       "\"height\"} or null when the photograph is missing}].\n"
       "A PLY file is described as imported: every vertex, positions and colours only; a bundle "
       "file too: its points, and its cameras with the photographs named by the list.txt two "
-      "folders up.");
+      "folders up.\n"
+      "For a .reel document the JSON object has \"file\", \"layers\" (the layer tree: each "
+      "{\"class\", \"name\", \"visible\", \"children\": [...]}, with \"points\", \"linked\" and "
+      "\"file\" for point layers, \"frames\" for camera paths and \"cameras\" for a bundle "
+      "file's camera field), \"cameraPaths\" (every camera path in the tree, depth first: "
+      "{\"class\", \"name\", \"frames\"}), \"transformStacks\" ([{\"name\", \"members\", "
+      "\"frames\"}]), \"timeline\" (null, or {\"fps\", \"lengthSeconds\", \"lengthFrames\", "
+      "\"inPoint\", \"outPoint\", \"tracks\": [{\"class\", \"title\", \"clips\"}]}), "
+      "\"sceneCamera\" ({\"name\", \"position\", \"heading\", \"pitch\", \"bank\", "
+      "\"fieldOfView\" (degrees), \"aspect\", \"zNear\", \"zFar\"}), \"bookmarks\" (names), "
+      "\"overrideBuckets\" and \"bucketOverrideFraction\" (null in files written before "
+      "they existed). A document whose linked point file is missing is refused, naming the "
+      "file.");
   return command;
 }
 
 int runInfoCommand(const InfoOptions& options) {
   const std::filesystem::path path = options.file;
+  if (isDocumentFile(path)) {
+    return describeDocument(path, options.json);
+  }
   const PointFileKind kind = pointFileKind(path);
   std::optional<PlyHeaderDescription> header;
   if (kind == PointFileKind::Ply) {

@@ -1,7 +1,7 @@
 #pragma once
-// `cloudreel info FILE [--json]`: describes the point layer a ".rwb",
-// ".ply" or bundle ".out" file opens as, with a bundle file's cameras, as a
-// short text or one JSON object on standard output.
+// `cloudreel info FILE [--json]`: describes a ".reel" document, or the
+// point layer a ".rwb", ".ply" or bundle ".out" file opens as, with a bundle
+// file's cameras, as a short text or one JSON object on standard output.
 
 #include <string>
 

@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "cli/convert_command.h"
+#include "cli/import_command.h"
 #include "cli/info_command.h"
 #include "platform/log.h"
 
@@ -26,6 +27,8 @@ int main(int argc, char** argv) {
   const CLI::App* infoCommand = cloudreel::cli::addInfoCommand(app, info);
   cloudreel::cli::ConvertOptions convert;
   const CLI::App* convertCommand = cloudreel::cli::addConvertCommand(app, convert);
+  cloudreel::cli::ImportOptions import;
+  const CLI::App* importCommand = cloudreel::cli::addImportCommand(app, import);
 
   CLI11_PARSE(app, argc, argv);
   cloudreel::setLogThreshold(verbose ? cloudreel::LogLevel::Debug : cloudreel::LogLevel::Warning);
@@ -34,6 +37,9 @@ int main(int argc, char** argv) {
   }
   if (convertCommand->parsed()) {
     return cloudreel::cli::runConvertCommand(convert);
+  }
+  if (importCommand->parsed()) {
+    return cloudreel::cli::runImportCommand(import);
   }
   std::fputs(app.help().c_str(), stdout);
   return 0;

@@ -13,6 +13,7 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <map>
 #include <nlohmann/json.hpp>
 #include <numbers>
 #include <set>
@@ -102,6 +103,23 @@ std::string pointFile(const std::vector<std::uint8_t>& lucks, bool normals, std:
     bytes.append(normals ? 27 : 15, '\0').push_back(static_cast<char>(luck));
   }
   return bytes.append(faces * 12, '\0');
+}
+
+// A reconstruction of three cameras and 20 points. Each camera: focal k1
+// k2, the rotation R by rows, the translation t. Point i lies at
+// (i/2 - 3, i % 5 - 2, -(i % 3) / 4), seen by two cameras; the box is
+// x -3 .. 6.5, y -2 .. 2, z -0.5 .. 0.
+std::string bundleText() {
+  std::ostringstream bundle;
+  bundle << "# Bundle file v0.3\n3 20\n"
+            "500 -0.01 0.002\n1 0 0\n0 1 0\n0 0 1\n0 0 -5\n"
+            "800 0 0\n0.8 0 -0.6\n0 1 0\n0.6 0 0.8\n1 -2 3\n"
+            "700 0.1 0\n0 -1 0\n1 0 0\n0 0 1\n0.5 0.25 -4\n";
+  for (int i = 0; i < 20; ++i) {
+    bundle << i * 0.5 - 3 << ' ' << i % 5 - 2 << ' ' << -(i % 3) * 0.25 << '\n'
+           << i * 10 << ' ' << 255 - i << " 7\n2 0 " << i << " 1.5 -2.25 2 " << i << " 0.5 0.75\n";
+  }
+  return bundle.str();
 }
 
 TEST(CliInfo, DescribesPlyFilesInEveryFormatAsTheirImportedLayer) {
@@ -200,18 +218,7 @@ TEST(CliInfo, DescribesABundleFileWithItsCamerasAndTheirPhotographs) {
   ASSERT_NE(stbi_write_jpg((dir / "scene/images/b.jpg").c_str(), 100, 50, 1, grey.data(), 90), 0);
   writeFile(dir / "scene/list.txt",
             "images/a.jpg 0 500\nimages/b.jpg 0 800\nimages/gone.jpg 0 700\n");
-  // Each camera: focal k1 k2, the rotation R by rows, the translation t.
-  std::ostringstream bundle;
-  bundle << "# Bundle file v0.3\n3 20\n"
-            "500 -0.01 0.002\n1 0 0\n0 1 0\n0 0 1\n0 0 -5\n"
-            "800 0 0\n0.8 0 -0.6\n0 1 0\n0.6 0 0.8\n1 -2 3\n"
-            "700 0.1 0\n0 -1 0\n1 0 0\n0 0 1\n0.5 0.25 -4\n";
-  // Point i at (i/2 - 3, i % 5 - 2, -(i % 3) / 4), seen by two cameras.
-  for (int i = 0; i < 20; ++i) {
-    bundle << i * 0.5 - 3 << ' ' << i % 5 - 2 << ' ' << -(i % 3) * 0.25 << '\n'
-           << i * 10 << ' ' << 255 - i << " 7\n2 0 " << i << " 1.5 -2.25 2 " << i << " 0.5 0.75\n";
-  }
-  writeFile(dir / "scene/bundle/bundle.out", bundle.str());
+  writeFile(dir / "scene/bundle/bundle.out", bundleText());
 
   const nlohmann::json info = infoJson(dir, "scene/bundle/bundle.out");
   EXPECT_EQ(info["points"], 20);
@@ -306,6 +313,184 @@ TEST(CliCommands, RefuseBadInputWithOneLineNamingTheFileAndLeaveNoOutput) {
     EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
     EXPECT_EQ(run.err.rfind("cloudreel: ", 0), 0u) << run.err;
     EXPECT_NE(run.err.find(named), std::string::npos) << run.err;
+  }
+  const std::set<fs::path> after(fs::directory_iterator(dir.path()), fs::directory_iterator());
+  EXPECT_EQ(after, before);
+}
+
+// Three frames of 4x4 matrices moving along x.
+constexpr const char* kMatrixPath =
+    "3\n"
+    "1 0 0 0  0 1 0 0  0 0 1 10  0 0 0 1\n"
+    "1 0 0 1  0 1 0 0  0 0 1 10  0 0 0 1\n"
+    "1 0 0 2  0 1 0 0  0 0 1 10  0 0 0 1\n";
+
+// The scene inputs every import test starts from: a PLY scan, a point file,
+// a reconstruction and a camera path of each kind.
+void writeSceneInputs(const TempDir& dir) {
+  writeFile(dir / "cloud.ply", plyCloud(300, "binary_little_endian"));
+  writeFile(dir / "points.rwb", pointFile(std::vector<std::uint8_t>(1000, 9), false, 0));
+  writeFile(dir / "scene/bundle/bundle.out", bundleText());
+  writeFile(dir / "path.txt", kMatrixPath);
+  writeFile(dir / "zxy.txt", "2\n0 0 5 0 0 0\n1 0 5 0 90 0\n");
+}
+
+std::vector<std::string> strings(const nlohmann::json& list, const char* key) {
+  std::vector<std::string> values;
+  for (const nlohmann::json& item : list) {
+    values.push_back(item[key].get<std::string>());
+  }
+  return values;
+}
+
+TEST(CliImport, MakesADocumentOfEveryKindOfInputThatInfoDescribes) {
+  TempDir dir;
+  writeSceneInputs(dir);
+  const Outcome run =
+      cloudreel(dir, {"import", "scene.reel", "cloud.ply", "points.rwb", "scene/bundle/bundle.out",
+                      "--zxy-path", "zxy.txt", "--matrix-path", "path.txt", "--downsample", "2"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_EQ(run.out, "");
+
+  const nlohmann::json info = infoJson(dir, "scene.reel");
+  const nlohmann::json& layers = info["layers"];
+  EXPECT_EQ(strings(layers, "class"),
+            (std::vector<std::string>{"PLYFile", "PointLayer", "BundlerFile", "DiscreteCameraPath",
+                                      "ZXYCameraPath"}));
+  EXPECT_EQ(
+      strings(layers, "name"),
+      (std::vector<std::string>{"cloud.ply", "points.rwb", "bundle.out", "path.txt", "zxy.txt"}));
+  EXPECT_EQ(layers[0]["points"], 150);  // the downsampling applies to PLY files only
+  EXPECT_EQ(layers[1]["points"], 1000);
+  EXPECT_EQ(layers[1]["linked"], false);
+  EXPECT_EQ(layers[2]["points"], 20);
+  ASSERT_EQ(layers[2]["children"].size(), 1u);
+  EXPECT_EQ(layers[2]["children"][0]["class"], "CameraField");
+  EXPECT_EQ(layers[2]["children"][0]["cameras"], 3);
+  EXPECT_EQ(layers[3]["frames"], 3);
+  // The document's paths, as found in the layer tree: the bundle file's
+  // cameras first, then the path files in their order of import.
+  EXPECT_EQ(strings(info["cameraPaths"], "class"),
+            (std::vector<std::string>{"CameraField", "DiscreteCameraPath", "ZXYCameraPath"}));
+  EXPECT_EQ(info["cameraPaths"][0]["frames"], 3);
+  EXPECT_EQ(info["cameraPaths"][2]["frames"], 2);
+  EXPECT_EQ(info["timeline"]["fps"], 25);
+  EXPECT_EQ(info["overrideBuckets"], true);
+
+  // The new document's camera looks down -z at the union of the boxes
+  // (x -3 .. 298, y -149 .. 5, z -3 .. 6) and sees its sphere whole,
+  // between its near and far planes.
+  const nlohmann::json& camera = info["sceneCamera"];
+  const auto position = camera["position"].get<std::vector<double>>();
+  ASSERT_EQ(position.size(), 3u);
+  EXPECT_NEAR(position[0], 147.5, 1e-3);
+  EXPECT_NEAR(position[1], -72, 1e-3);
+  const double radius = std::hypot(301.0, 154.0, 9.0) / 2;
+  const double distance = position[2] - 1.5;
+  const double halfAngle = camera["fieldOfView"].get<double>() / 2 * std::numbers::pi / 180;
+  EXPECT_GE(distance * std::sin(halfAngle), radius);
+  EXPECT_GT(camera["zNear"].get<double>(), 0);
+  EXPECT_LT(camera["zNear"].get<double>(), distance - radius);
+  EXPECT_GT(camera["zFar"].get<double>(), distance + radius);
+
+  const Outcome text = cloudreel(dir, {"info", "scene.reel"});
+  EXPECT_EQ(text.status, 0);
+  EXPECT_NE(text.out.find("\n  BundlerFile \"bundle.out\", 20 points\n"
+                          "    CameraField \"Cameras\", 3 cameras\n"),
+            std::string::npos)
+      << text.out;
+
+  // A second import appends and leaves the camera where the user has it.
+  const Outcome again = cloudreel(dir, {"import", "scene.reel", "points.rwb"});
+  ASSERT_EQ(again.status, 0) << again.err;
+  const nlohmann::json appended = infoJson(dir, "scene.reel");
+  EXPECT_EQ(appended["layers"].size(), 6u);
+  EXPECT_EQ(appended["layers"][5]["class"], "PointLayer");
+  EXPECT_EQ(appended["cameraPaths"], info["cameraPaths"]);
+  EXPECT_EQ(appended["sceneCamera"], info["sceneCamera"]);
+}
+
+TEST(CliImport, LinkedLayersAreReadFromTheirFilesAndAMissingOneIsNamed) {
+  TempDir dir;
+  writeSceneInputs(dir);
+  ASSERT_EQ(cloudreel(dir, {"import", "inline.reel", "points.rwb"}).status, 0);
+  const Outcome linked = cloudreel(dir, {"import", "linked.reel", "points.rwb", "--link"});
+  ASSERT_EQ(linked.status, 0) << linked.err;
+  // The 16,000 bytes of records stay in the point file.
+  EXPECT_GT(fs::file_size(dir / "inline.reel"), 16000u);
+  EXPECT_LT(fs::file_size(dir / "linked.reel"), 16000u);
+  const nlohmann::json info = infoJson(dir, "linked.reel");
+  EXPECT_EQ(info["layers"][0]["linked"], true);
+  EXPECT_EQ(info["layers"][0]["points"], 1000);
+  EXPECT_EQ(info["layers"][0]["file"], (fs::canonical(dir.path()) / "points.rwb").string());
+
+  fs::rename(dir / "points.rwb", dir / "moved.rwb");
+  for (const auto& args :
+       {std::vector<std::string>{"info", "linked.reel"}, {"info", "linked.reel", "--json"}}) {
+    const Outcome run = cloudreel(dir, args);
+    EXPECT_NE(run.status, 0);
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
+    EXPECT_EQ(run.err.rfind("cloudreel: linked.reel: ", 0), 0u) << run.err;
+    EXPECT_NE(run.err.find("points.rwb"), std::string::npos) << run.err;
+  }
+  EXPECT_EQ(infoJson(dir, "inline.reel")["layers"][0]["points"], 1000);
+}
+
+TEST(CliImport, RefusesWithOneLineAndLeavesTheDocumentAsItWas) {
+  TempDir dir;
+  writeSceneInputs(dir);
+  ASSERT_EQ(cloudreel(dir, {"import", "good.reel", "cloud.ply"}).status, 0);
+  const std::string good = readFile(dir / "good.reel");
+  writeFile(dir / "garbage.reel", "this is no document\n");
+  writeFile(dir / "truncated.reel", good.substr(0, good.size() / 2));
+  writeFile(dir / "garbage.ply", "this is not a point cloud\n");
+  writeFile(dir / "garbage.out", "this is not a reconstruction\n");
+  writeFile(dir / "notes.txt", "no camera path here\n");
+  const std::string points = pointFile({1, 2, 3, 4}, false, 0);
+  writeFile(dir / "truncated.rwb", points.substr(0, points.size() - 20));
+  const std::set<fs::path> before(fs::directory_iterator(dir.path()), fs::directory_iterator());
+  const std::map<fs::path, std::string> documents = {
+      {"good.reel", good},
+      {"garbage.reel", readFile(dir / "garbage.reel")},
+      {"truncated.reel", readFile(dir / "truncated.reel")}};
+
+  // Damaged documents are refused by info and import alike.
+  std::vector<std::pair<std::vector<std::string>, std::string>> runs;
+  for (const std::string document : {"garbage.reel", "truncated.reel"}) {
+    const std::string said = "cloudreel: " + document + ": The document is corrupt\n";
+    runs.push_back({{"info", document}, said});
+    runs.push_back({{"info", document, "--json"}, said});
+    runs.push_back({{"import", document, "cloud.ply"}, said});
+  }
+  // A file that cannot be imported is named, whether the document exists
+  // or would be made.
+  for (const auto& bad : {std::vector<std::string>{"missing.ply"},
+                          {"garbage.ply"},
+                          {"truncated.rwb"},
+                          {"garbage.out"},
+                          {"notes.txt"},
+                          {"--matrix-path", "missing.txt"},
+                          {"--matrix-path", "notes.txt"},
+                          {"--zxy-path", "notes.txt"}}) {
+    for (const std::string document : {"good.reel", "new.reel"}) {
+      std::vector<std::string> args = {"import", document, "cloud.ply"};
+      args.insert(args.end(), bad.begin(), bad.end());
+      runs.push_back({args, bad.back()});
+    }
+  }
+  runs.push_back({{"import", "new.txt", "cloud.ply"}, "new.txt"});
+  for (const auto& [args, said] : runs) {
+    SCOPED_TRACE(args[0] + " " + args[1] + " " + args.back());
+    const Outcome run = cloudreel(dir, args);
+    EXPECT_NE(run.status, 0);
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
+    EXPECT_EQ(run.err.rfind("cloudreel: ", 0), 0u) << run.err;
+    EXPECT_NE(run.err.find(said), std::string::npos) << run.err;
+  }
+  for (const auto& [document, bytes] : documents) {
+    EXPECT_TRUE(readFile(dir / document) == bytes) << document << " changed";
   }
   const std::set<fs::path> after(fs::directory_iterator(dir.path()), fs::directory_iterator());
   EXPECT_EQ(after, before);
