@@ -171,7 +171,7 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
       std::min(static_cast<std::uint64_t>(clampedToInt32(cameraCount)), camerasBegun));
   pointCount = clampedToInt32(pointCount);
 
-  auto field = std::make_shared<CameraField>();
+  std::vector<std::shared_ptr<Camera>> cameras;
   std::int32_t made = 0;
   for (; made < cameraCount && !scanner.atEnd(); ++made) {
     auto camera = BundlerCamera::initWithFileHandleFileIndex(scanner, made);
@@ -180,10 +180,23 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
         camera->setImagePath(photograph);
       }
     }
-    field->addCamera(std::move(camera));
+    cameras.push_back(std::move(camera));
   }
   ncameras_ = made;
-  addChildLayer(field);
+  // A linked layer is read again each time its document opens, and the
+  // document already holds its camera field, perhaps as a camera path or a
+  // track's object too: that field is refilled rather than joined by a
+  // second one.
+  auto field = childLayerCount() > 0
+                   ? std::dynamic_pointer_cast<CameraField>(childLayers().front())
+                   : nullptr;
+  if (field) {
+    field->setCameras(std::move(cameras));
+  } else {
+    field = std::make_shared<CameraField>();
+    field->setCameras(std::move(cameras));
+    addChildLayer(field);
+  }
 
   const auto capacity = static_cast<std::int32_t>(std::min<std::uint64_t>(
       static_cast<std::uint64_t>(pointCount), scanner.remainingBytes() / kSmallestPointRecord));

@@ -264,6 +264,15 @@ TEST(BundlerFile, ALinkedLayerIsReadFromItsFileAgainWhenDecoded) {
     ASSERT_TRUE(decoded);
     EXPECT_EQ(decoded->nPoints(), 5);
     EXPECT_EQ(decoded->colorPoints()[4].y, -4.0f);
+    // One camera field, however often the layer is opened: reading the file
+    // again refills the field the document already knows.
+    ASSERT_EQ(decoded->childLayerCount(), 1);
+    const auto field = std::dynamic_pointer_cast<CameraField>(decoded->childLayers()[0]);
+    ASSERT_TRUE(field);
+    EXPECT_EQ(field->cameras().size(), 1U);
+    const auto again = testing::roundTrip(decoded);
+    ASSERT_TRUE(again);
+    EXPECT_EQ(again->childLayerCount(), 1);
   }
 }
 
