@@ -6,7 +6,12 @@
 #include <cmath>
 
 #include "camera/camera.h"
+#include "platform/application_defaults.h"
+#include "platform/log.h"
+#include "platform/user_defaults.h"
 #include "platform/value.h"
+#include "render/gl/image.h"
+#include "render/gl/image_file.h"
 
 namespace cloudreel {
 
@@ -67,6 +72,37 @@ void OpenGLScene::setupFrustumForCamera(const Camera& camera, float stereoOffset
   right += stereoOffset;
   glFrustum(left, right, bottom, top, zNear, zFar);
   glMatrixMode(GL_MODELVIEW);
+}
+
+bool OpenGLScene::captureImageToFile(std::string_view fileName, Error* error) const {
+  gl::RgbaImage bitmap;
+  bitmap.width = std::max(width_, 0);
+  bitmap.height = std::max(height_, 0);
+  bitmap.pixels.resize(bitmap.rowBytes() * static_cast<std::size_t>(bitmap.height));
+  GLint readFramebuffer = 0;
+  glGetIntegerv(GL_READ_FRAMEBUFFER_BINDING, &readFramebuffer);
+  glReadBuffer(readFramebuffer == 0 ? GL_FRONT : GL_COLOR_ATTACHMENT0);
+  glFinish();
+  glPushClientAttrib(GL_CLIENT_PIXEL_STORE_BIT);
+  glPixelStorei(GL_PACK_ALIGNMENT, 4);
+  glPixelStorei(GL_PACK_ROW_LENGTH, 0);
+  glPixelStorei(GL_PACK_SKIP_ROWS, 0);
+  glPixelStorei(GL_PACK_SKIP_PIXELS, 0);
+  while (glGetError() != GL_NO_ERROR) {
+  }
+  glReadPixels(0, 0, bitmap.width, bitmap.height, GL_RGBA, GL_UNSIGNED_INT_8_8_8_8_REV,
+               bitmap.pixels.data());
+  const GLenum glError = glGetError();
+  glPopClientAttrib();
+  if (glError != GL_NO_ERROR) {
+    setError(error, "Cloudreel", 100, fmt::sprintf("Cannot read the view's pixels (OpenGL error %04x)", glError));
+    return false;
+  }
+  gl::flipRows(bitmap.pixels, bitmap.rowBytes(), static_cast<std::size_t>(bitmap.height));
+  const std::string path =
+      UserDefaults::standardUserDefaults().stringForKey(kImageSavePathKey) + std::string(fileName);
+  logf("Screenshot saved at %s", path);
+  return gl::writeColorTiff(path, bitmap, error);
 }
 
 }  // namespace cloudreel

@@ -4,6 +4,10 @@
 // planes of the camera it is set up for; the scene's own fieldOfView, zNear
 // and zFar are kept with the scene for the callers that made it.
 
+#include <string_view>
+
+#include "platform/error.h"
+
 namespace cloudreel {
 
 class Camera;
@@ -45,6 +49,16 @@ class OpenGLScene {
   // model-view matrix selected.
   void setupFrustumForCamera(const Camera& camera) const;
   void setupFrustumForCamera(const Camera& camera, float stereoOffset) const;
+
+  // Reads what was last drawn, the scene's size from (0, 0), and writes it
+  // as a colour TIFF to the user default KTImageSavePath with `fileName`
+  // appended directly: no separator is put in between, so the folder is
+  // expected to end in "/" (a path of "/tmp/shots" writes
+  // "/tmp/shotsout.tiff"). Reads the front buffer of a window, the first
+  // colour attachment when a framebuffer object is bound. Logs "Screenshot
+  // saved at %s"; false, with the reason, when the pixels cannot be read or
+  // the file cannot be written.
+  bool captureImageToFile(std::string_view fileName, Error* error = nullptr) const;
 
  private:
   OpenGLScene(int width, int height, double fieldOfView, double zNear, double zFar)

@@ -70,7 +70,7 @@ bool extAvailable() { return epoxy_has_gl_extension("GL_EXT_framebuffer_object")
 }  // namespace
 
 std::optional<Framebuffer> Framebuffer::create(int width, int height, Error* error,
-                                               FramebufferApi api) {
+                                               FramebufferApi api, unsigned* incompleteStatus) {
   GLContext* context = GLContext::current();
   if (context == nullptr) {
     fail(error, GLErrorCode::NoCurrentContext, "No OpenGL context is current to make a framebuffer in.");
@@ -160,6 +160,9 @@ std::optional<Framebuffer> Framebuffer::create(int width, int height, Error* err
     return std::nullopt;
   }
   if (status != GL_FRAMEBUFFER_COMPLETE) {
+    if (incompleteStatus != nullptr) {
+      *incompleteStatus = status;
+    }
     fail(error, GLErrorCode::FramebufferIncomplete,
          "The OpenGL implementation refused the framebuffer (status " + hex(status) +
              ", error " + hex(glError) + ").");
@@ -169,8 +172,8 @@ std::optional<Framebuffer> Framebuffer::create(int width, int height, Error* err
 }
 
 bool Framebuffer::readColor(RgbaImage& out, Error* error) const {
-  out = RgbaImage{};
   if (!framebuffer_.usableInCurrentContext()) {
+    out = RgbaImage{};
     return fail(error, GLErrorCode::NoCurrentContext,
                 "The framebuffer's OpenGL context is not current on this thread.");
   }
@@ -204,8 +207,8 @@ bool Framebuffer::readColor(RgbaImage& out, Error* error) const {
 }
 
 bool Framebuffer::readDepth(DepthImage& out, Error* error) const {
-  out = DepthImage{};
   if (!framebuffer_.usableInCurrentContext()) {
+    out = DepthImage{};
     return fail(error, GLErrorCode::NoCurrentContext,
                 "The framebuffer's OpenGL context is not current on this thread.");
   }

@@ -22,10 +22,12 @@ class Framebuffer {
   // Makes a framebuffer in the current context. Answers nothing, with an
   // InvalidSize error, for an empty size (0 or negative) or one beyond the
   // implementation's renderbuffer and viewport limits; FramebufferIncomplete
-  // if the implementation refuses the attachments or runs out of memory.
+  // if the implementation refuses the attachments or runs out of memory;
+  // then `incompleteStatus`, when given, receives the completeness status.
   [[nodiscard]] static std::optional<Framebuffer> create(int width, int height,
                                                          Error* error = nullptr,
-                                                         FramebufferApi api = FramebufferApi::Automatic);
+                                                         FramebufferApi api = FramebufferApi::Automatic,
+                                                         unsigned* incompleteStatus = nullptr);
 
   int width() const { return width_; }
   int height() const { return height_; }
@@ -34,8 +36,9 @@ class Framebuffer {
   // Core or Ext, never Automatic.
   FramebufferApi api() const { return api_; }
 
-  // Read back the whole frame, top row first, into `out` (reused between
-  // frames). The framebuffer's context must be current; otherwise answer
+  // Read back the whole frame, top row first, into `out`, whose memory is
+  // reused when it already has the frame's size (a render reads every frame
+  // into the same image). The framebuffer's context must be current; otherwise answer
   // false with a NoCurrentContext error and leave `out` empty.
   [[nodiscard]] bool readColor(RgbaImage& out, Error* error = nullptr) const;
   [[nodiscard]] bool readDepth(DepthImage& out, Error* error = nullptr) const;

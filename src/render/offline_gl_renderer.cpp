@@ -1,0 +1,208 @@
+#include "render/offline_gl_renderer.h"
+
+#include <epoxy/gl.h>
+
+#include <array>
+
+#include "camera/camera.h"
+#include "platform/application_defaults.h"
+#include "platform/log.h"
+#include "platform/user_defaults.h"
+#include "render/gl/gl_error.h"
+#include "render/gl/image_file.h"
+#include "scene/my_document.h"
+
+namespace cloudreel {
+namespace {
+
+constexpr std::string_view kRendererDomain = "Cloudreel";
+constexpr int kRendererErrorCode = 100;
+// The stereo separation is given in the settings sheet's units; the frustum
+// window moves by half of it over this, in the near plane's units, each way.
+constexpr double kStereoSeparationScale = 150.0;
+
+// The lighting every off-screen frame starts from. Whether lighting is on is
+// left to the layers (point layers with normals switch it on). No fog is set
+// up: a layer that fogs uses the context's default fog.
+void setUpLighting() {
+  constexpr std::array<GLfloat, 4> kAmbient{0.2f, 0.2f, 0.2f, 1.0f};
+  constexpr std::array<GLfloat, 4> kDiffuse{1.0f, 1.0f, 1.0f, 1.0f};
+  constexpr std::array<GLfloat, 4> kMaterialAmbient{0.1f, 0.1f, 0.1f, 1.0f};
+  constexpr std::array<GLfloat, 4> kMaterialDiffuse{0.9f, 0.9f, 0.9f, 1.0f};
+  glLightModelfv(GL_LIGHT_MODEL_AMBIENT, kAmbient.data());
+  glLightfv(GL_LIGHT0, GL_DIFFUSE, kDiffuse.data());
+  glEnable(GL_LIGHT0);
+  glMaterialfv(GL_FRONT, GL_AMBIENT, kMaterialAmbient.data());
+  glMaterialfv(GL_FRONT, GL_DIFFUSE, kMaterialDiffuse.data());
+}
+
+bool fail(Error* error, std::string message) {
+  setError(error, std::string(kRendererDomain), kRendererErrorCode, std::move(message));
+  return false;
+}
+
+// Keeps the first failure of a frame's files.
+void keepFirst(bool& ok, Error* error, const Error& failure) {
+  if (ok && error != nullptr) {
+    *error = failure;
+  }
+  ok = false;
+}
+
+}  // namespace
+
+OfflineGLRenderer::OfflineGLRenderer(const OpenGLScene& scene,
+                                     std::unique_ptr<gl::GLContext> context, bool exportDepth)
+    : scene_(scene),
+      context_(std::move(context)),
+      outputPath_(UserDefaults::standardUserDefaults().stringForKey(kImageSavePathKey)),
+      isDepthRender_(exportDepth) {
+  renderOptions_.setSceneCamera(nullptr);
+  renderOptions_.setValueForKey(false, kRenderOptionEditor);
+  // Off-screen frames always draw each point layer with its own bucket
+  // limit: the document's override is the interactive view's alone.
+  renderOptions_.setValueForKey(false, kRenderOptionBucketOverride);
+  renderOptions_.setValueForKey(1.0f, kRenderOptionBucketGlobal);
+}
+
+OfflineGLRenderer::~OfflineGLRenderer() {
+  // The framebuffer's names are deleted with this context current, or wait
+  // in the share group until one of its contexts is current.
+  if (context_) {
+    const gl::CurrentContext current(*context_);
+    framebuffer_.reset();
+  }
+}
+
+std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExportDepth(
+    const OpenGLScene& scene, gl::GLContext& shareWith, bool exportDepth, Error* error) {
+  Error failure;
+  std::unique_ptr<gl::GLContext> context = shareWith.createSharedContext(&failure);
+  if (!context) {
+    logErrorf("Cannot create the renderer's OpenGL context: %s", failure.message);
+    setError(error, failure.domain, failure.code, failure.message);
+    return nullptr;
+  }
+  std::unique_ptr<OfflineGLRenderer> renderer(
+      new OfflineGLRenderer(scene, std::move(context), exportDepth));
+  const gl::CurrentContext current(*renderer->context_, &failure);
+  if (!current) {
+    logErrorf("Cannot use the renderer's OpenGL context: %s", failure.message);
+    setError(error, failure.domain, failure.code, failure.message);
+    return nullptr;
+  }
+  glEnable(GL_BLEND);
+  glBlendFunc(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA);
+  glEnable(GL_DEPTH_TEST);
+  glDepthMask(GL_TRUE);
+
+  unsigned status = 0;
+  renderer->framebuffer_ = gl::Framebuffer::create(scene.width(), scene.height(), &failure,
+                                                   gl::FramebufferApi::Automatic, &status);
+  if (!renderer->framebuffer_) {
+    if (status != 0) {
+      logErrorf("Framebuffer not complete! %x", status);
+    } else {
+      logErrorf("OpenGL Error: %04x after init", static_cast<unsigned>(GL_INVALID_VALUE));
+    }
+    setError(error, failure.domain, failure.code, failure.message);
+    return nullptr;
+  }
+  if (const GLenum glError = glGetError(); glError != GL_NO_ERROR) {
+    logErrorf("OpenGL Error: %04x after init", glError);
+    fail(error, fmt::sprintf("OpenGL Error: %04x after init", glError));
+    return nullptr;
+  }
+  // The read-back images are made once for the whole render.
+  renderer->bitmap_.width = scene.width();
+  renderer->bitmap_.height = scene.height();
+  renderer->bitmap_.pixels.reserve(renderer->bitmap_.rowBytes() *
+                                   static_cast<std::size_t>(scene.height()));
+  if (exportDepth) {
+    renderer->depthBitmap_.values.reserve(static_cast<std::size_t>(scene.width()) *
+                                          static_cast<std::size_t>(scene.height()));
+  }
+  return renderer;
+}
+
+std::vector<std::filesystem::path> OfflineGLRenderer::pathsForFrame(int frame) const {
+  const std::string name = outputPattern_.format(frame);
+  if (isStereoRender_) {
+    return {outputPath_ / ("L_" + name), outputPath_ / ("R_" + name)};
+  }
+  if (isDepthRender_) {
+    return {outputPath_ / name, outputPath_ / ("depth_" + name)};
+  }
+  return {outputPath_ / name};
+}
+
+bool OfflineGLRenderer::renderFrameOfDocumentForCamera(int frame, MyDocument& document,
+                                                       const std::shared_ptr<Camera>& camera,
+                                                       Error* error) {
+  Error failure;
+  const gl::CurrentContext current(*context_, &failure);
+  if (!current || !framebuffer_ || !camera) {
+    return fail(error, !current ? failure.message : "Nothing to render through");
+  }
+  const gl::FramebufferBinding binding(*framebuffer_);
+  scene_.setViewport();
+  const std::vector<std::filesystem::path> paths = pathsForFrame(frame);
+  bool ok = true;
+  if (isStereoRender_) {
+    // No depth image in stereo, even when one was asked for.
+    const double halfShift = 0.5 * static_cast<double>(stereoSeparation_) / kStereoSeparationScale;
+    for (const auto& [offset, path] : {std::pair{halfShift, paths[0]}, std::pair{-halfShift, paths[1]}}) {
+      scene_.setupFrustumForCamera(*camera, static_cast<float>(offset));
+      renderColorFrameOfDocumentForCamera(document, camera);
+      if (!saveColorFrame(path, &failure)) {
+        keepFirst(ok, error, failure);
+      }
+    }
+    return ok;
+  }
+  scene_.setupFrustumForCamera(*camera, 0.0f);
+  renderColorFrameOfDocumentForCamera(document, camera);
+  if (!saveColorFrame(paths[0], &failure)) {
+    keepFirst(ok, error, failure);
+  }
+  if (isDepthRender_ && !saveDepthFrame(paths[1], &failure)) {
+    keepFirst(ok, error, failure);
+  }
+  return ok;
+}
+
+void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document,
+                                                            const std::shared_ptr<Camera>& camera) {
+  glMatrixMode(GL_MODELVIEW);
+  glLoadIdentity();
+  glClearColor(0, 0, 0, 0);
+  glClear(GL_COLOR_BUFFER_BIT | GL_DEPTH_BUFFER_BIT);
+  setUpLighting();
+  renderOptions_.setSceneCamera(camera);
+  document.drawContentWithOptions(renderOptions_);
+  glFinish();
+  if (const GLenum glError = glGetError(); glError != GL_NO_ERROR) {
+    // The frame is still saved.
+    logWarningf("OpenGL Error: %04x", glError);
+  }
+}
+
+bool OfflineGLRenderer::readColorFrame(gl::RgbaImage& out, Error* error) {
+  return framebuffer_ && framebuffer_->readColor(out, error);
+}
+
+bool OfflineGLRenderer::saveColorFrame(const std::filesystem::path& path, Error* error) {
+  if (!readColorFrame(bitmap_, error)) {
+    return false;
+  }
+  return gl::writeColorTiff(path, bitmap_, error);
+}
+
+bool OfflineGLRenderer::saveDepthFrame(const std::filesystem::path& path, Error* error) {
+  if (!framebuffer_ || !framebuffer_->readDepth(depthBitmap_, error)) {
+    return false;
+  }
+  return gl::writeDepthTiff(path, depthBitmap_, error);
+}
+
+}  // namespace cloudreel

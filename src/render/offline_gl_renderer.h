@@ -1,0 +1,101 @@
+#pragma once
+// Renders a document into image files without a view: one frame at a time
+// into an off-screen framebuffer of its own context (which shares display
+// lists and buffers with the document's), read back and written as TIFF,
+// with a depth image a frame or as a left and right stereo pair.
+//
+// A renderer serves one render and one thread at a time: every frame makes
+// its context current on the calling thread and puts back what was current
+// before, so the frames of a render may run on a background thread while the
+// main thread applies the timeline between them.
+
+#include <filesystem>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "platform/error.h"
+#include "render/frame_pattern.h"
+#include "render/gl/framebuffer.h"
+#include "render/gl/gl_context.h"
+#include "render/gl/image.h"
+#include "render/opengl_scene.h"
+#include "render/render_options.h"
+
+namespace cloudreel {
+
+class Camera;
+class MyDocument;
+
+class OfflineGLRenderer {
+ public:
+  // A renderer drawing the scene's size in a new context that shares with
+  // `shareWith`. Null when the context, the framebuffer or the read-back
+  // images cannot be made; the reason is logged ("Framebuffer not complete!
+  // %x", "OpenGL Error: %04x after init") and given in `error`.
+  [[nodiscard]] static std::unique_ptr<OfflineGLRenderer> initWithSceneContextExportDepth(
+      const OpenGLScene& scene, gl::GLContext& shareWith, bool exportDepth,
+      Error* error = nullptr);
+  ~OfflineGLRenderer();
+  OfflineGLRenderer(const OfflineGLRenderer&) = delete;
+  OfflineGLRenderer& operator=(const OfflineGLRenderer&) = delete;
+
+  // Draws frame `frame` through the camera and writes its files into
+  // outputPath: the colour frame named by the pattern, and "depth_" + that
+  // name when rendering depth; in stereo only "L_" and "R_" + that name, the
+  // frustum shifted by ±0.5 × separation / 150. Every file is drawn and
+  // written even when an earlier one fails; the answer is false, with the
+  // first failure in `error`, if any was not written (the application
+  // ignores it, the command line reports it).
+  bool renderFrameOfDocumentForCamera(int frame, MyDocument& document,
+                                      const std::shared_ptr<Camera>& camera,
+                                      Error* error = nullptr);
+
+  // Clears and draws one colour frame through the camera, with the frustum
+  // already set up by the caller (renderFrameOfDocumentForCamera does it).
+  // Makes the renderer's context current; the caller keeps it current for
+  // the save that follows (CurrentContext around both).
+  void renderColorFrameOfDocumentForCamera(MyDocument& document,
+                                           const std::shared_ptr<Camera>& camera);
+  // Read back what was drawn, top row first, and write it atomically.
+  bool saveColorFrame(const std::filesystem::path& path, Error* error = nullptr);
+  bool saveDepthFrame(const std::filesystem::path& path, Error* error = nullptr);
+  // Reads the last drawn colour frame into memory instead (the renderer's
+  // own bitmap, RGBA, top row first); false without a current context.
+  bool readColorFrame(gl::RgbaImage& out, Error* error = nullptr);
+
+  // The files frame `frame` writes, in the order written.
+  std::vector<std::filesystem::path> pathsForFrame(int frame) const;
+
+  gl::GLContext& context() { return *context_; }
+  const OpenGLScene& scene() const { return scene_; }
+  const RenderOptions& renderOptions() const { return renderOptions_; }
+
+  bool isDepthRender() const { return isDepthRender_; }
+  const std::filesystem::path& outputPath() const { return outputPath_; }
+  void setOutputPath(std::filesystem::path v) { outputPath_ = std::move(v); }
+  const FramePattern& outputPattern() const { return outputPattern_; }
+  void setOutputPattern(FramePattern v) { outputPattern_ = std::move(v); }
+  bool isStereoRender() const { return isStereoRender_; }
+  void setIsStereoRender(bool v) { isStereoRender_ = v; }
+  float stereoSeparation() const { return stereoSeparation_; }
+  void setStereoSeparation(float v) { stereoSeparation_ = v; }
+
+ private:
+  OfflineGLRenderer(const OpenGLScene& scene, std::unique_ptr<gl::GLContext> context,
+                    bool exportDepth);
+
+  OpenGLScene scene_;
+  std::unique_ptr<gl::GLContext> context_;
+  std::optional<gl::Framebuffer> framebuffer_;
+  std::filesystem::path outputPath_;
+  FramePattern outputPattern_;
+  RenderOptions renderOptions_;
+  bool isDepthRender_ = false;
+  bool isStereoRender_ = false;
+  float stereoSeparation_ = 0.0f;
+  gl::RgbaImage bitmap_;
+  gl::DepthImage depthBitmap_;
+};
+
+}  // namespace cloudreel
