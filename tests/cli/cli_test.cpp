@@ -2,11 +2,8 @@
 // temporary folder, the built program started on them, its exit status,
 // standard output and standard error examined.
 
-#include <fcntl.h>
 #include <gtest/gtest.h>
-#include <spawn.h>
 #include <stb/stb_image_write.h>
-#include <sys/wait.h>
 
 #include <algorithm>
 #include <array>
@@ -21,54 +18,20 @@
 #include <string>
 #include <vector>
 
+#include "support/cli_runner.h"
 #include "support/ply_text.h"
 #include "support/temp_dir.h"
 
-extern char** environ;
-
 namespace {
 
+using cloudreel::testing::cloudreel;
+using cloudreel::testing::Outcome;
 using cloudreel::testing::PlyElement;
 using cloudreel::testing::plyText;
 using cloudreel::testing::readFile;
 using cloudreel::testing::TempDir;
 using cloudreel::testing::writeFile;
 namespace fs = std::filesystem;
-
-struct Outcome {
-  int status = -1;
-  std::string out;
-  std::string err;
-};
-
-// Runs cloudreel in `dir` with its output streams in files kept outside it,
-// so the folder holds only what the command itself leaves there.
-Outcome cloudreel(const TempDir& dir, std::vector<std::string> args) {
-  static const TempDir streams;
-  args.insert(args.begin(), CLOUDREEL_BINARY);
-  std::vector<char*> argv;
-  for (std::string& arg : args) {
-    argv.push_back(arg.data());
-  }
-  argv.push_back(nullptr);
-  posix_spawn_file_actions_t actions;
-  posix_spawn_file_actions_init(&actions);
-  posix_spawn_file_actions_addchdir_np(&actions, dir.path().c_str());
-  const std::string out = streams / "out", err = streams / "err";
-  posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
-  posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
-  Outcome run;
-  pid_t pid = 0;
-  int waitStatus = 0;
-  if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0 &&
-      waitpid(pid, &waitStatus, 0) == pid && WIFEXITED(waitStatus)) {
-    run.status = WEXITSTATUS(waitStatus);
-  }
-  posix_spawn_file_actions_destroy(&actions);
-  run.out = readFile(out);
-  run.err = readFile(err);
-  return run;
-}
 
 nlohmann::json infoJson(const TempDir& dir, const std::string& file) {
   const Outcome run = cloudreel(dir, {"info", file, "--json"});
