@@ -41,4 +41,6 @@ std::optional<std::string> LoggingUserInteraction::runOpenPanel(const OpenPanel&
   return std::nullopt;
 }
 
+void LoggingUserInteraction::beep() { logf("beep"); }
+
 }  // namespace cloudreel

@@ -1,7 +1,8 @@
 #pragma once
 // What the core must ask or tell the user: an error, an alert with buttons,
-// an open panel. The Qt shell shows real dialogs, the command line answers
-// from its options and prints, and tests script the answers.
+// an open panel, the beep of a refused command. The Qt shell shows real
+// dialogs, the command line answers from its options and prints, and tests
+// script the answers.
 
 #include <memory>
 #include <optional>
@@ -38,6 +39,9 @@ class UserInteraction {
   virtual int runAlert(const Alert& alert) = 0;
   // Answers the chosen path, or nothing when the user cancels.
   virtual std::optional<std::string> runOpenPanel(const OpenPanel& panel) = 0;
+  // The system beep: a command that cannot be carried out as things stand
+  // (a cut without both marks) says so without a dialog.
+  virtual void beep() = 0;
 
   // The process-wide front end; tests and the command line install theirs.
   // Until one is installed, errors and alerts are logged, alerts answer their
@@ -49,12 +53,14 @@ class UserInteraction {
 };
 
 // The built-in front end for headless use: writes errors and alerts to the
-// log, answers alerts with their default button and cancels open panels.
+// log, answers alerts with their default button and cancels open panels; a
+// beep is a debug line.
 class LoggingUserInteraction final : public UserInteraction {
  public:
   void presentError(const Error& error) override;
   int runAlert(const Alert& alert) override;
   std::optional<std::string> runOpenPanel(const OpenPanel& panel) override;
+  void beep() override;
 };
 
 }  // namespace cloudreel

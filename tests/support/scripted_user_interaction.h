@@ -42,10 +42,12 @@ class ScriptedUserInteraction : public UserInteraction {
     panelAnswers_.pop_front();
     return answer;
   }
+  void beep() override { ++beeps; }
 
   std::vector<Error> errors;
   std::vector<Alert> alerts;
   std::vector<OpenPanel> panels;
+  int beeps = 0;
 
  private:
   std::deque<int> alertAnswers_;
