@@ -8,6 +8,7 @@
 #include "cli/convert_command.h"
 #include "cli/import_command.h"
 #include "cli/info_command.h"
+#include "cli/render_command.h"
 #include "platform/log.h"
 
 int main(int argc, char** argv) {
@@ -29,6 +30,8 @@ int main(int argc, char** argv) {
   const CLI::App* convertCommand = cloudreel::cli::addConvertCommand(app, convert);
   cloudreel::cli::ImportOptions import;
   const CLI::App* importCommand = cloudreel::cli::addImportCommand(app, import);
+  cloudreel::cli::RenderCommandOptions render;
+  const CLI::App* renderCommand = cloudreel::cli::addRenderCommand(app, render);
 
   CLI11_PARSE(app, argc, argv);
   cloudreel::setLogThreshold(verbose ? cloudreel::LogLevel::Debug : cloudreel::LogLevel::Warning);
@@ -40,6 +43,9 @@ int main(int argc, char** argv) {
   }
   if (importCommand->parsed()) {
     return cloudreel::cli::runImportCommand(import);
+  }
+  if (renderCommand->parsed()) {
+    return cloudreel::cli::runRenderCommand(render);
   }
   std::fputs(app.help().c_str(), stdout);
   return 0;
