@@ -108,6 +108,7 @@ std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExport
     setError(error, failure.domain, failure.code, failure.message);
     return nullptr;
   }
+  renderer->framebuffer_->bind();
   if (const GLenum glError = glGetError(); glError != GL_NO_ERROR) {
     logErrorf("OpenGL Error: %04x after init", glError);
     fail(error, fmt::sprintf("OpenGL Error: %04x after init", glError));
@@ -144,7 +145,7 @@ bool OfflineGLRenderer::renderFrameOfDocumentForCamera(int frame, MyDocument& do
   if (!current || !framebuffer_ || !camera) {
     return fail(error, !current ? failure.message : "Nothing to render through");
   }
-  const gl::FramebufferBinding binding(*framebuffer_);
+  framebuffer_->bind();
   scene_.setViewport();
   const std::vector<std::filesystem::path> paths = pathsForFrame(frame);
   bool ok = true;
@@ -173,6 +174,11 @@ bool OfflineGLRenderer::renderFrameOfDocumentForCamera(int frame, MyDocument& do
 
 void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document,
                                                             const std::shared_ptr<Camera>& camera) {
+  // The context is the renderer's own: its framebuffer stays bound, so
+  // what a caller reads or captures after the frame is this frame.
+  if (framebuffer_) {
+    framebuffer_->bind();
+  }
   glMatrixMode(GL_MODELVIEW);
   glLoadIdentity();
   glClearColor(0, 0, 0, 0);

@@ -51,10 +51,10 @@ class OfflineGLRenderer {
                                       const std::shared_ptr<Camera>& camera,
                                       Error* error = nullptr);
 
-  // Clears and draws one colour frame through the camera, with the frustum
-  // already set up by the caller (renderFrameOfDocumentForCamera does it).
-  // Makes the renderer's context current; the caller keeps it current for
-  // the save that follows (CurrentContext around both).
+  // Clears and draws one colour frame through the camera into the
+  // renderer's framebuffer, with the frustum already set up by the caller
+  // (renderFrameOfDocumentForCamera does it). The renderer's context must be
+  // current (CurrentContext around the draw and the save or read after it).
   void renderColorFrameOfDocumentForCamera(MyDocument& document,
                                            const std::shared_ptr<Camera>& camera);
   // Read back what was drawn, top row first, and write it atomically.

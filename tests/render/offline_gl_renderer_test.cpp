@@ -137,6 +137,16 @@ TEST_F(OfflineRendererTest, AFrameLandsWherePointsProjectWithTheirColoursAndDept
   EXPECT_NEAR(depth->sample(48, 8, 0), expected, 3);
   EXPECT_NEAR(depth->sample(32, 16, 0), expected, 3);
   EXPECT_EQ(depth->sample(0, 0, 0), 65535);
+
+  // The same frame drawn and read into memory, as a caller that wants the
+  // pixels rather than files does.
+  const gl::CurrentContext current(r->context());
+  r->scene().setupFrustumForCamera(*testCamera());
+  r->renderColorFrameOfDocumentForCamera(document, testCamera());
+  gl::RgbaImage image;
+  ASSERT_TRUE(r->readColorFrame(image));
+  const auto* pixel = &image.pixels[(8 * kWidth + 48) * 4];
+  EXPECT_EQ((std::array{pixel[0], pixel[1], pixel[2]}), (std::array<std::uint8_t, 3>{255, 0, 0}));
 }
 
 TEST_F(OfflineRendererTest, AStereoPairShiftsTheFrustumAndWritesOnlyLeftAndRight) {

@@ -230,17 +230,24 @@ bool Framebuffer::readDepth(DepthImage& out, Error* error) const {
   return true;
 }
 
+void Framebuffer::bind() const {
+  if (api_ == FramebufferApi::Ext) {
+    glBindFramebufferEXT(GL_FRAMEBUFFER_EXT, framebuffer_.get());
+  } else {
+    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer_.get());
+  }
+  glViewport(0, 0, width_, height_);
+}
+
 FramebufferBinding::FramebufferBinding(const Framebuffer& framebuffer) : api_(framebuffer.api_) {
   glGetIntegerv(GL_VIEWPORT, previousViewport_);
   if (api_ == FramebufferApi::Ext) {
     glGetIntegerv(GL_FRAMEBUFFER_BINDING_EXT, &previousDraw_);
-    glBindFramebufferEXT(GL_FRAMEBUFFER_EXT, framebuffer.framebuffer_.get());
   } else {
     glGetIntegerv(GL_DRAW_FRAMEBUFFER_BINDING, &previousDraw_);
     glGetIntegerv(GL_READ_FRAMEBUFFER_BINDING, &previousRead_);
-    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer.framebuffer_.get());
   }
-  glViewport(0, 0, framebuffer.width_, framebuffer.height_);
+  framebuffer.bind();
 }
 
 FramebufferBinding::~FramebufferBinding() {

@@ -43,6 +43,11 @@ class Framebuffer {
   [[nodiscard]] bool readColor(RgbaImage& out, Error* error = nullptr) const;
   [[nodiscard]] bool readDepth(DepthImage& out, Error* error = nullptr) const;
 
+  // Binds it for drawing and reading in the current context and sets the
+  // viewport to all of it, for good: for a context that draws only here
+  // (FramebufferBinding binds for a scope).
+  void bind() const;
+
  private:
   friend class FramebufferBinding;
   Framebuffer() = default;

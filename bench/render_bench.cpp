@@ -1,0 +1,194 @@
+// Frames per second of an off-screen render at 1920 × 1080 through the
+// document's drawing root, for documents of 1 and 10 million points, in
+// the stages of a render frame: drawing only, drawing and reading the
+// colour back, and the whole frame written (colour alone, colour and
+// depth). The difference between the last two and the second is what
+// writing the files costs.
+//
+// CLOUDREEL_BENCH_DIR sets the folder for the frames (default the temporary
+// folder); they are removed at the end.
+
+#include <benchmark/benchmark.h>
+#include <stdlib.h>
+
+#include <cstdio>
+#include <filesystem>
+#include <map>
+#include <memory>
+#include <random>
+#include <string>
+
+#include "bench_files.h"
+#include "camera/camera.h"
+#include "platform/application_defaults.h"
+#include "platform/log.h"
+#include "render/gl/egl_context.h"
+#include "render/offline_gl_renderer.h"
+#include "scene/my_document.h"
+#include "scene/point_layer.h"
+
+namespace cloudreel {
+namespace {
+
+constexpr int kWidth = 1920;
+constexpr int kHeight = 1080;
+
+struct Setup {
+  std::filesystem::path folder;
+  std::string error;
+
+  Setup() {
+    (void)useFactoryDefaultsInMemory();
+    setLogSink([](std::string_view) {});
+    std::string pattern = (bench::benchFolder() / "render_bench.XXXXXX").string();
+    if (mkdtemp(pattern.data()) == nullptr) {
+      error = "no folder for the frames";
+      return;
+    }
+    folder = pattern;
+  }
+  ~Setup() {
+    std::error_code ignored;
+    std::filesystem::remove_all(folder, ignored);
+  }
+};
+
+Setup& setup() {
+  static Setup instance;
+  return instance;
+}
+
+// A document holding a cloud of n points in the cube [-1, 1]³, seen whole by
+// a camera 3 units away; its renderer, with or without depth, writes into
+// the bench folder.
+struct Scene {
+  MyDocument document;
+  std::shared_ptr<Camera> camera = std::make_shared<Camera>();
+  std::unique_ptr<OfflineGLRenderer> renderer;
+  std::string error;
+
+  Scene(std::int32_t n, bool depth) {
+    auto layer = std::make_shared<PointLayer>();
+    layer->allocatePointArrayWithSize(n);
+    layer->setNPoints(n);
+    std::mt19937 random(7);
+    std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
+    for (color_point& p : layer->colorPoints()) {
+      p = {unit(random),
+           unit(random),
+           unit(random) - 3.0f,
+           static_cast<std::uint8_t>(random()),
+           static_cast<std::uint8_t>(random()),
+           static_cast<std::uint8_t>(random()),
+           static_cast<std::uint8_t>(random() % 255)};
+    }
+    layer->setPointSize(1.0f);
+    document.addLayer(layer);
+    camera->setFieldOfView(45.0f);
+    camera->setZNear(1.0f);
+    camera->setZFar(10.0f);
+    const auto context = document.sharedGLContext();
+    Error failure;
+    if (context) {
+      renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
+          OpenGLScene::initWithWidthHeightFieldOfView(kWidth, kHeight, 45.0), *context, depth,
+          &failure);
+    }
+    if (!renderer) {
+      error = context ? failure.message : "no OpenGL context";
+      return;
+    }
+    renderer->setOutputPath(setup().folder);
+    if (auto* egl = dynamic_cast<gl::EglContext*>(context.get())) {
+      std::fprintf(stderr, "context: %s\n", egl->description().c_str());
+    }
+  }
+};
+
+// Documents are kept between benchmarks: making ten million points and
+// building their drawing takes longer than several frames.
+Scene& sceneOf(std::int32_t n, bool depth) {
+  static std::map<std::pair<std::int32_t, bool>, std::unique_ptr<Scene>> scenes;
+  auto& scene = scenes[{n, depth}];
+  if (!scene) {
+    scenes.clear();
+    scene = std::make_unique<Scene>(n, depth);
+  }
+  return *scene;
+}
+
+void countFrames(benchmark::State& state) {
+  state.counters["frames/s"] =
+      benchmark::Counter(static_cast<double>(state.iterations()), benchmark::Counter::kIsRate);
+}
+
+// Draws one colour frame, reading it back when asked.
+void drawFrame(Scene& scene, bool readBack) {
+  OfflineGLRenderer& renderer = *scene.renderer;
+  const gl::CurrentContext current(renderer.context());
+  renderer.scene().setupFrustumForCamera(*scene.camera);
+  renderer.renderColorFrameOfDocumentForCamera(scene.document, scene.camera);
+  if (readBack) {
+    gl::RgbaImage image;
+    (void)renderer.readColorFrame(image);
+    benchmark::DoNotOptimize(image.pixels.data());
+  }
+}
+
+template <typename Frame>
+void run(benchmark::State& state, bool depth, Frame&& frame) {
+  if (!setup().error.empty()) {
+    state.SkipWithError(setup().error.c_str());
+    return;
+  }
+  Scene& scene = sceneOf(static_cast<std::int32_t>(state.range(0)), depth);
+  if (!scene.renderer) {
+    state.SkipWithError(scene.error.c_str());
+    return;
+  }
+  // The first frame builds the cloud's drawing; it is not a render's
+  // steady cost.
+  drawFrame(scene, false);
+  int n = 0;
+  for (auto _ : state) {
+    frame(scene, n++);
+  }
+  countFrames(state);
+}
+
+void BM_DrawOnly(benchmark::State& state) {
+  run(state, false, [](Scene& scene, int) { drawFrame(scene, false); });
+}
+
+void BM_DrawAndReadBack(benchmark::State& state) {
+  run(state, false, [](Scene& scene, int) { drawFrame(scene, true); });
+}
+
+void BM_WholeFrame(benchmark::State& state) {
+  const bool depth = state.range(1) != 0;
+  run(state, depth, [](Scene& scene, int n) {
+    (void)scene.renderer->renderFrameOfDocumentForCamera(n % 4, scene.document, scene.camera);
+  });
+}
+
+BENCHMARK(BM_DrawOnly)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
+BENCHMARK(BM_DrawAndReadBack)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
+BENCHMARK(BM_WholeFrame)
+    ->Args({1'000'000, 0})
+    ->Args({1'000'000, 1})
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->MinTime(3);
+BENCHMARK(BM_DrawOnly)->Arg(10'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->Iterations(3);
+BENCHMARK(BM_DrawAndReadBack)->Arg(10'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->Iterations(3);
+BENCHMARK(BM_WholeFrame)
+    ->Args({10'000'000, 0})
+    ->Args({10'000'000, 1})
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->Iterations(3);
+
+}  // namespace
+}  // namespace cloudreel
+
+BENCHMARK_MAIN();
