@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "cli/convert_command.h"
+#include "cli/demo_command.h"
 #include "cli/import_command.h"
 #include "cli/info_command.h"
 #include "cli/render_command.h"
@@ -32,6 +33,8 @@ int main(int argc, char** argv) {
   const CLI::App* importCommand = cloudreel::cli::addImportCommand(app, import);
   cloudreel::cli::RenderCommandOptions render;
   const CLI::App* renderCommand = cloudreel::cli::addRenderCommand(app, render);
+  cloudreel::cli::DemoOptions demo;
+  const CLI::App* demoCommand = cloudreel::cli::addDemoCommand(app, demo);
 
   CLI11_PARSE(app, argc, argv);
   cloudreel::setLogThreshold(verbose ? cloudreel::LogLevel::Debug : cloudreel::LogLevel::Warning);
@@ -46,6 +49,9 @@ int main(int argc, char** argv) {
   }
   if (renderCommand->parsed()) {
     return cloudreel::cli::runRenderCommand(render);
+  }
+  if (demoCommand->parsed()) {
+    return cloudreel::cli::runDemoCommand(demo);
   }
   std::fputs(app.help().c_str(), stdout);
   return 0;

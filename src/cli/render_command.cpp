@@ -56,33 +56,6 @@ bool parseInt(std::string_view text, int& out) {
   return ec == std::errc() && ptr == end && !text.empty();
 }
 
-bool parseSize(const std::string& text, int& width, int& height, std::string& why) {
-  if (text.empty()) {
-    width = kResolutionPresets[0].width;
-    height = kResolutionPresets[0].height;
-    return true;
-  }
-  if (const auto preset = resolutionPresetNamed(text)) {
-    width = kResolutionPresets[static_cast<std::size_t>(*preset)].width;
-    height = kResolutionPresets[static_cast<std::size_t>(*preset)].height;
-    return true;
-  }
-  const auto x = text.find_first_of("xX");
-  // The largest frame any OpenGL implementation makes is far below this;
-  // the limit keeps the read-back images' sizes from overflowing.
-  constexpr int kLargest = 32768;
-  if (x != std::string::npos && parseInt(std::string_view(text).substr(0, x), width) &&
-      parseInt(std::string_view(text).substr(x + 1), height) && width > 0 && height > 0 &&
-      width <= kLargest && height <= kLargest) {
-    return true;
-  }
-  std::string labels;
-  for (const ResolutionPreset& preset : kResolutionPresets) {
-    labels += (labels.empty() ? "\"" : ", \"") + std::string(preset.label) + "\"";
-  }
-  why = "Unknown size \"" + text + "\": give WIDTHxHEIGHT (1 to 32768 each) or one of " + labels;
-  return false;
-}
 
 // "A-B" with 0 <= A <= B.
 bool parseFrames(const std::string& text, RenderFrameRange& range) {
@@ -125,6 +98,34 @@ int badInput(const RenderCommandOptions& options, const std::string& message) {
 }
 
 }  // namespace
+
+bool parseRenderSize(const std::string& text, int& width, int& height, std::string& why) {
+  if (text.empty()) {
+    width = kResolutionPresets[0].width;
+    height = kResolutionPresets[0].height;
+    return true;
+  }
+  if (const auto preset = resolutionPresetNamed(text)) {
+    width = kResolutionPresets[static_cast<std::size_t>(*preset)].width;
+    height = kResolutionPresets[static_cast<std::size_t>(*preset)].height;
+    return true;
+  }
+  const auto x = text.find_first_of("xX");
+  // The largest frame any OpenGL implementation makes is far below this;
+  // the limit keeps the read-back images' sizes from overflowing.
+  constexpr int kLargest = 32768;
+  if (x != std::string::npos && parseInt(std::string_view(text).substr(0, x), width) &&
+      parseInt(std::string_view(text).substr(x + 1), height) && width > 0 && height > 0 &&
+      width <= kLargest && height <= kLargest) {
+    return true;
+  }
+  std::string labels;
+  for (const ResolutionPreset& preset : kResolutionPresets) {
+    labels += (labels.empty() ? "\"" : ", \"") + std::string(preset.label) + "\"";
+  }
+  why = "Unknown size \"" + text + "\": give WIDTHxHEIGHT (1 to 32768 each) or one of " + labels;
+  return false;
+}
 
 CLI::App* addRenderCommand(CLI::App& app, RenderCommandOptions& options) {
   CLI::App* command = app.add_subcommand(
@@ -183,7 +184,7 @@ int renderDocument(MyDocument& document, const RenderCommandOptions& options) {
   std::string why;
   int width = 0;
   int height = 0;
-  if (!parseSize(options.size, width, height, why)) {
+  if (!parseRenderSize(options.size, width, height, why)) {
     return badInput(options, why);
   }
   Error error;
