@@ -11,6 +11,7 @@
 #include <benchmark/benchmark.h>
 #include <stdlib.h>
 
+#include <chrono>
 #include <cstdio>
 #include <filesystem>
 #include <map>
@@ -26,6 +27,7 @@
 #include "render/offline_gl_renderer.h"
 #include "scene/my_document.h"
 #include "scene/point_layer.h"
+#include "timeline/render_run.h"
 
 namespace cloudreel {
 namespace {
@@ -171,9 +173,41 @@ void BM_WholeFrame(benchmark::State& state) {
   });
 }
 
+// A render run of eight frames, whose files are written on their own thread
+// while the next frame is drawn: what `cloudreel render` does.
+void BM_RenderRun(benchmark::State& state) {
+  const bool depth = state.range(1) != 0;
+  constexpr int kFrames = 8;
+  run(state, depth, [](Scene& scene, int) {
+    // A run owns its renderer and lets it go at its end, so each run gets
+    // a new one (a context and framebuffer; the cloud's drawing is shared).
+    RunLoop loop;
+    bool done = false;
+    RenderRun::Hooks hooks;
+    hooks.prepareFrame = [&](int) { return scene.camera; };
+    hooks.finished = [&](bool) { done = true; };
+    auto renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
+        scene.renderer->scene(), *scene.document.sharedGLContext(),
+        scene.renderer->isDepthRender());
+    renderer->setOutputPath(setup().folder);
+    auto frames =
+        RenderRun::create(scene.document, std::move(renderer), {-1, kFrames - 1}, hooks, loop);
+    frames->start();
+    (void)loop.runUntil([&] { return done; }, std::chrono::hours(1));
+  });
+  state.counters["frames/s"] = benchmark::Counter(
+      static_cast<double>(state.iterations() * kFrames), benchmark::Counter::kIsRate);
+}
+
 BENCHMARK(BM_DrawOnly)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
 BENCHMARK(BM_DrawAndReadBack)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
 BENCHMARK(BM_WholeFrame)
+    ->Args({1'000'000, 0})
+    ->Args({1'000'000, 1})
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->MinTime(3);
+BENCHMARK(BM_RenderRun)
     ->Args({1'000'000, 0})
     ->Args({1'000'000, 1})
     ->Unit(benchmark::kMillisecond)
@@ -187,6 +221,12 @@ BENCHMARK(BM_WholeFrame)
     ->Unit(benchmark::kMillisecond)
     ->UseRealTime()
     ->Iterations(3);
+BENCHMARK(BM_RenderRun)
+    ->Args({10'000'000, 0})
+    ->Args({10'000'000, 1})
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->Iterations(1);
 
 }  // namespace
 }  // namespace cloudreel

@@ -114,15 +114,6 @@ std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExport
     fail(error, fmt::sprintf("OpenGL Error: %04x after init", glError));
     return nullptr;
   }
-  // The read-back images are made once for the whole render.
-  renderer->bitmap_.width = scene.width();
-  renderer->bitmap_.height = scene.height();
-  renderer->bitmap_.pixels.reserve(renderer->bitmap_.rowBytes() *
-                                   static_cast<std::size_t>(scene.height()));
-  if (exportDepth) {
-    renderer->depthBitmap_.values.reserve(static_cast<std::size_t>(scene.width()) *
-                                          static_cast<std::size_t>(scene.height()));
-  }
   return renderer;
 }
 
@@ -140,36 +131,101 @@ std::vector<std::filesystem::path> OfflineGLRenderer::pathsForFrame(int frame) c
 bool OfflineGLRenderer::renderFrameOfDocumentForCamera(int frame, MyDocument& document,
                                                        const std::shared_ptr<Camera>& camera,
                                                        Error* error) {
+  DrawnFrame drawn = drawFrameOfDocumentForCamera(frame, document, camera);
+  return writeDrawnFrame(drawn, error);
+}
+
+OfflineGLRenderer::DrawnFrame OfflineGLRenderer::drawFrameOfDocumentForCamera(
+    int frame, MyDocument& document, const std::shared_ptr<Camera>& camera) {
+  DrawnFrame drawn;
+  drawn.frame = frame;
   Error failure;
   const gl::CurrentContext current(*context_, &failure);
   if (!current || !framebuffer_ || !camera) {
-    return fail(error, !current ? failure.message : "Nothing to render through");
+    drawn.failed = true;
+    fail(&drawn.error, !current ? failure.message : "Nothing to render through");
+    return drawn;
   }
   framebuffer_->bind();
   scene_.setViewport();
   const std::vector<std::filesystem::path> paths = pathsForFrame(frame);
-  bool ok = true;
+  const auto drawColour = [&](float offset, const std::filesystem::path& path) {
+    scene_.setupFrustumForCamera(*camera, offset);
+    renderColorFrameOfDocumentForCamera(document, camera);
+    DrawnFrame::ColourFile file{path, spareColourImage()};
+    if (!readColorFrame(file.image, &failure) && !drawn.failed) {
+      drawn.failed = true;
+      drawn.error = failure;
+    }
+    drawn.colour.push_back(std::move(file));
+  };
   if (isStereoRender_) {
     // No depth image in stereo, even when one was asked for.
     const double halfShift = 0.5 * static_cast<double>(stereoSeparation_) / kStereoSeparationScale;
-    for (const auto& [offset, path] : {std::pair{halfShift, paths[0]}, std::pair{-halfShift, paths[1]}}) {
-      scene_.setupFrustumForCamera(*camera, static_cast<float>(offset));
-      renderColorFrameOfDocumentForCamera(document, camera);
-      if (!saveColorFrame(path, &failure)) {
-        keepFirst(ok, error, failure);
-      }
+    drawColour(static_cast<float>(halfShift), paths[0]);
+    drawColour(static_cast<float>(-halfShift), paths[1]);
+    return drawn;
+  }
+  drawColour(0.0f, paths[0]);
+  if (isDepthRender_) {
+    DrawnFrame::DepthFile file{paths[1], spareDepthImage()};
+    if (!framebuffer_->readDepth(file.image, &failure) && !drawn.failed) {
+      drawn.failed = true;
+      drawn.error = failure;
     }
-    return ok;
+    drawn.depth = std::move(file);
   }
-  scene_.setupFrustumForCamera(*camera, 0.0f);
-  renderColorFrameOfDocumentForCamera(document, camera);
-  if (!saveColorFrame(paths[0], &failure)) {
+  return drawn;
+}
+
+bool OfflineGLRenderer::writeDrawnFrame(DrawnFrame& drawn, Error* error) {
+  bool ok = !drawn.failed;
+  if (!ok && error != nullptr) {
+    *error = drawn.error;
+  }
+  Error failure;
+  // Every file is written even when an earlier one failed.
+  for (DrawnFrame::ColourFile& file : drawn.colour) {
+    if (file.image.isConsistent() && !file.image.pixels.empty() &&
+        !gl::writeColorTiff(file.path, file.image, &failure)) {
+      keepFirst(ok, error, failure);
+    }
+  }
+  if (drawn.depth && !drawn.depth->image.values.empty() &&
+      !gl::writeDepthTiff(drawn.depth->path, drawn.depth->image, &failure)) {
     keepFirst(ok, error, failure);
   }
-  if (isDepthRender_ && !saveDepthFrame(paths[1], &failure)) {
-    keepFirst(ok, error, failure);
+  // The images go back for the frames to come.
+  const std::lock_guard lock(spareMutex_);
+  for (DrawnFrame::ColourFile& file : drawn.colour) {
+    spareColour_.push_back(std::move(file.image));
   }
+  if (drawn.depth) {
+    spareDepth_.push_back(std::move(drawn.depth->image));
+  }
+  drawn.colour.clear();
+  drawn.depth.reset();
   return ok;
+}
+
+gl::RgbaImage OfflineGLRenderer::spareColourImage() {
+  const std::lock_guard lock(spareMutex_);
+  if (spareColour_.empty()) {
+    return {};
+  }
+  gl::RgbaImage image = std::move(spareColour_.back());
+  spareColour_.pop_back();
+  return image;
+}
+
+gl::DepthImage OfflineGLRenderer::spareDepthImage() {
+  const std::lock_guard lock(spareMutex_);
+  if (spareDepth_.empty()) {
+    return {};
+  }
+  gl::DepthImage image = std::move(spareDepth_.back());
+  spareDepth_.pop_back();
+  return image;
 }
 
 void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document,

@@ -11,6 +11,8 @@
 
 #include <filesystem>
 #include <memory>
+#include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -51,6 +53,33 @@ class OfflineGLRenderer {
                                       const std::shared_ptr<Camera>& camera,
                                       Error* error = nullptr);
 
+  // A frame drawn and read back, its files not yet written: the two halves
+  // of renderFrameOfDocumentForCamera, so that a render can write one
+  // frame's files on another thread while it draws the next.
+  struct DrawnFrame {
+    struct ColourFile {
+      std::filesystem::path path;
+      gl::RgbaImage image;
+    };
+    struct DepthFile {
+      std::filesystem::path path;
+      gl::DepthImage image;
+    };
+    int frame = 0;
+    std::vector<ColourFile> colour;
+    std::optional<DepthFile> depth;
+    // Drawing or reading back failed; nothing of it is written.
+    bool failed = false;
+    Error error;
+  };
+  // Draws every view of the frame and reads each back into images of its
+  // own (reused from frames already written).
+  DrawnFrame drawFrameOfDocumentForCamera(int frame, MyDocument& document,
+                                          const std::shared_ptr<Camera>& camera);
+  // Writes the drawn frame's files and keeps its images for later frames.
+  // Needs no context: any thread may write while another draws.
+  bool writeDrawnFrame(DrawnFrame& frame, Error* error = nullptr);
+
   // Clears and draws one colour frame through the camera into the
   // renderer's framebuffer, with the frustum already set up by the caller
   // (renderFrameOfDocumentForCamera does it). The renderer's context must be
@@ -84,6 +113,8 @@ class OfflineGLRenderer {
  private:
   OfflineGLRenderer(const OpenGLScene& scene, std::unique_ptr<gl::GLContext> context,
                     bool exportDepth);
+  gl::RgbaImage spareColourImage();
+  gl::DepthImage spareDepthImage();
 
   OpenGLScene scene_;
   std::unique_ptr<gl::GLContext> context_;
@@ -96,6 +127,11 @@ class OfflineGLRenderer {
   float stereoSeparation_ = 0.0f;
   gl::RgbaImage bitmap_;
   gl::DepthImage depthBitmap_;
+  // Read-back images of written frames, kept so that a render allocates its
+  // images once (two frames' worth when writing overlaps drawing).
+  std::mutex spareMutex_;
+  std::vector<gl::RgbaImage> spareColour_;
+  std::vector<gl::DepthImage> spareDepth_;
 };
 
 }  // namespace cloudreel

@@ -39,6 +39,7 @@ RenderRun::RenderRun(MyDocument& document, std::unique_ptr<OfflineGLRenderer> re
       range_(range),
       hooks_(std::move(hooks)),
       mainLoop_(mainLoop),
+      writer_(std::make_unique<BackgroundQueue>()),
       background_(std::make_unique<BackgroundQueue>()) {}
 
 RenderRun::~RenderRun() = default;
@@ -73,33 +74,67 @@ void RenderRun::renderNextFrame() {
   }
   std::shared_ptr<Camera> camera = hooks_.prepareFrame ? hooks_.prepareFrame(frame) : nullptr;
 
-  struct Outcome {
-    bool written = false;
-    Error error;
-  };
-  auto outcome = std::make_shared<Outcome>();
+  auto drawn = std::make_shared<OfflineGLRenderer::DrawnFrame>();
   // The work holds no reference to the run: the completion does, so the
-  // run outlives the work and is let go on the main thread, never on the
+  // run outlives the work and is let go on the main thread, never on a
   // background thread it would have to join.
   background_->async(
-      [this, frame, camera = std::move(camera), outcome] {
+      [this, frame, camera = std::move(camera), drawn] {
         if (renderer_) {
-          outcome->written =
-              renderer_->renderFrameOfDocumentForCamera(frame, document_, camera, &outcome->error);
+          *drawn = renderer_->drawFrameOfDocumentForCamera(frame, document_, camera);
         } else {
-          outcome->error = Error{"Cloudreel", 100, "No renderer"};
+          drawn->frame = frame;
+          drawn->failed = true;
+          drawn->error = Error{"Cloudreel", 100, "No renderer"};
         }
       },
-      mainLoop_,
-      [self = shared_from_this(), frame, outcome] {
-        if (self->hooks_.frameFinished) {
-          self->hooks_.frameFinished(frame, outcome->written, outcome->error);
+      mainLoop_, [self = shared_from_this(), drawn] { self->frameDrawn(drawn); });
+}
+
+void RenderRun::frameDrawn(const std::shared_ptr<OfflineGLRenderer::DrawnFrame>& drawn) {
+  // The frame's files are written on their own thread while the next frame
+  // is set up and drawn; the frame after that waits for the writer, so at
+  // most two frames' images are held.
+  ++pendingWrites_;
+  auto result = std::make_shared<WriteResult>();
+  writer_->async(
+      [this, drawn, result] {
+        if (renderer_) {
+          result->written = renderer_->writeDrawnFrame(*drawn, &result->error);
+        } else {
+          result->error = drawn->error;
         }
-        self->renderNextFrame();
+      },
+      mainLoop_, [self = shared_from_this(), frame = drawn->frame, result] {
+        self->frameWritten(frame, *result);
       });
+  if (pendingWrites_ < kMostPendingWrites) {
+    renderNextFrame();
+  } else {
+    waitingForWriter_ = true;
+  }
+}
+
+void RenderRun::frameWritten(int frame, const WriteResult& result) {
+  --pendingWrites_;
+  if (hooks_.frameFinished) {
+    hooks_.frameFinished(frame, result.written, result.error);
+  }
+  if (waitingForWriter_) {
+    waitingForWriter_ = false;
+    renderNextFrame();
+  } else if (ending_ && pendingWrites_ == 0) {
+    finish(endCancelled_);
+  }
 }
 
 void RenderRun::finish(bool cancelled) {
+  // Frames still being written are part of the run: it ends after them.
+  if (pendingWrites_ > 0) {
+    ending_ = true;
+    endCancelled_ = cancelled;
+    return;
+  }
   running_ = false;
   document_.setEnableViewUpdates(true);
   // The renderer goes with its context now, not whenever the last step

@@ -1,9 +1,11 @@
 #pragma once
 // A render run: the frames of a range produced one after the other, the
 // main thread putting the scene in the state of each frame (applying the
-// timeline) and a background thread drawing and writing it. Exactly one
-// frame is in flight, so the document is never animated while a frame is
-// being drawn, and no lock is needed. The timeline window and the command
+// timeline) and a background thread drawing it. Exactly one frame is drawn
+// at a time, and only while the main thread waits for it, so the document
+// is never animated while a frame is being drawn, and no lock is needed.
+// A drawn frame's files are written on a thread of their own while the
+// next frame is set up and drawn. The timeline window and the command
 // line drive the same run; what differs (how the cursor moves, where
 // progress shows, which camera looks) comes in as hooks.
 //
@@ -15,12 +17,12 @@
 
 #include "platform/error.h"
 #include "platform/run_loop.h"
+#include "render/offline_gl_renderer.h"
 
 namespace cloudreel {
 
 class Camera;
 class MyDocument;
-class OfflineGLRenderer;
 class Timeline;
 
 // The frames a run covers: current + 1 to last, inclusive.
@@ -86,8 +88,19 @@ class RenderRun : public std::enable_shared_from_this<RenderRun> {
  private:
   RenderRun(MyDocument& document, std::unique_ptr<OfflineGLRenderer> renderer,
             RenderFrameRange range, Hooks hooks, RunLoop& mainLoop);
+  struct WriteResult {
+    bool written = false;
+    Error error;
+  };
+  // At most this many frames wait for or undergo writing; the next frame
+  // is drawn only below it.
+  static constexpr int kMostPendingWrites = 2;
+
   // One step on the main thread: the next frame, or the end.
   void renderNextFrame();
+  // On the main thread once a frame is drawn: its files go to the writer.
+  void frameDrawn(const std::shared_ptr<OfflineGLRenderer::DrawnFrame>& drawn);
+  void frameWritten(int frame, const WriteResult& result);
   void finish(bool cancelled);
 
   MyDocument& document_;
@@ -96,8 +109,15 @@ class RenderRun : public std::enable_shared_from_this<RenderRun> {
   Hooks hooks_;
   RunLoop& mainLoop_;
   bool running_ = false;
-  // Declared last: destroyed first, so its thread finishes any frame still
-  // queued while the renderer it uses is alive.
+  int pendingWrites_ = 0;
+  bool waitingForWriter_ = false;
+  // The range is done or cancelled, and the run ends when the last files
+  // are written.
+  bool ending_ = false;
+  bool endCancelled_ = false;
+  // Declared last: destroyed first, so their threads finish any frame still
+  // queued while the renderer they use is alive.
+  std::unique_ptr<BackgroundQueue> writer_;
   std::unique_ptr<BackgroundQueue> background_;
 };
 
