@@ -27,6 +27,7 @@
 namespace cloudreel {
 
 class Camera;
+class CameraPath;
 class MyDocument;
 
 class OfflineGLRenderer {
@@ -133,5 +134,15 @@ class OfflineGLRenderer {
   std::vector<gl::RgbaImage> spareColour_;
   std::vector<gl::DepthImage> spareDepth_;
 };
+
+// The view-controls panel's render of a camera path: each of the path's
+// frames through its camera, at 720 × 480 with the view's field of view and
+// near and far planes, into the user default KTImageSavePath as
+// "out_%04d.tiff", on the calling thread without progress. Logs "Rendered
+// %d frames in %d seconds, FPS:%0.2f" (whole seconds, so a render under a
+// second logs an infinite rate). Answers how many frames were drawn; none
+// when no renderer can be made (the log says why).
+int renderCameraPathOfDocument(const CameraPath& path, MyDocument& document, double fieldOfView,
+                               float zNear, float zFar);
 
 }  // namespace cloudreel

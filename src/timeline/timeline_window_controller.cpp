@@ -3,10 +3,14 @@
 #include <chrono>
 #include <cmath>
 
+#include "camera/scene_camera.h"
 #include "platform/log.h"
 #include "platform/user_interaction.h"
 #include "platform/value.h"
+#include "render/offline_gl_renderer.h"
+#include "render/render_properties_controller.h"
 #include "scene/my_document.h"
+#include "timeline/render_run.h"
 #include "timeline/edit_point.h"
 #include "timeline/timeline.h"
 #include "timeline/timeline_clip.h"
@@ -399,6 +403,50 @@ std::optional<TimelineDrag> TimelineWindowController::mouseDown(Point2D point, c
   }
   setCursor(t);
   return drag;
+}
+
+std::shared_ptr<RenderRun> TimelineWindowController::renderTimeline(
+    const RenderPropertiesController& settings, std::shared_ptr<RenderProgressController> progress,
+    std::function<void(bool cancelled)> finished) {
+  const std::shared_ptr<Timeline> tl = timeline();
+  if (document_ == nullptr || !tl) {
+    return nullptr;
+  }
+  MyDocument& document = *document_;
+  const RenderFrameRange range = settings.renderRangeSelected() ==
+                                         static_cast<int>(RenderRange::WholeTimeline)
+                                     ? wholeTimelineRange(*tl)
+                                     : markedRange(*tl);
+  const std::shared_ptr<SceneCamera> camera = document.sceneCamera();
+  std::unique_ptr<OfflineGLRenderer> renderer;
+  if (const auto context = document.sharedGLContext()) {
+    renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
+        OpenGLScene::initWithWidthHeightFieldOfViewZNearZFar(
+            settings.width(), settings.height(), camera ? camera->fieldOfView() : 45.0,
+            settings.zNear(), settings.zFar()),
+        *context, settings.shouldRenderDepth());
+  }
+  if (renderer) {
+    renderer->setOutputPath(settings.outputPath());
+    renderer->setOutputPattern(settings.outputPattern());
+    renderer->setIsStereoRender(settings.renderInStereo());
+    renderer->setStereoSeparation(settings.stereoSeparation());
+  }
+  RenderRun::Hooks hooks;
+  hooks.progress = [progress](int frame, int last) {
+    if (progress) {
+      progress->setProgressFrameLastFrame(frame, last);
+    }
+  };
+  hooks.hasCancelled = [progress] { return progress && progress->hasCancelled(); };
+  hooks.prepareFrame = [this, tl, camera](int frame) -> std::shared_ptr<Camera> {
+    setCursor(timeForRenderFrame(*tl, frame));
+    return camera;
+  };
+  hooks.finished = std::move(finished);
+  auto run = RenderRun::create(document, std::move(renderer), range, std::move(hooks), runLoop_);
+  run->start();
+  return run;
 }
 
 }  // namespace cloudreel

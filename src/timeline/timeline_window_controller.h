@@ -10,6 +10,7 @@
 // applied at the new time and the document told it has changed.
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -24,6 +25,9 @@ namespace cloudreel {
 
 class EditPoint;
 class MyDocument;
+class RenderProgressController;
+class RenderPropertiesController;
+class RenderRun;
 class Timeline;
 class TimelineClip;
 class TimelineTrack;
@@ -158,6 +162,18 @@ class TimelineWindowController : public Object, public Observer {
   // the marks and where playback stops).
   void forwardStep();
   void backwardStep();
+
+  // --- rendering the timeline to files
+  // Renders the document's timeline through its scene camera with the
+  // settings sheet's values: the whole timeline or the marked range, each
+  // frame's time set through setCursor on the main thread before the frame
+  // is drawn. The progress sheet shows each frame, its cancel ends the run
+  // before the next frame, and `finished` is called once at the end. A
+  // renderer that cannot be made draws nothing, and the run still walks its
+  // range. Answers the run; null without a document.
+  std::shared_ptr<RenderRun> renderTimeline(const RenderPropertiesController& settings,
+                                            std::shared_ptr<RenderProgressController> progress,
+                                            std::function<void(bool cancelled)> finished = {});
 
   // --- a click in the track area. The point is in the view's coordinates;
   // the time is x / pixelsPerSecond, and the track is the timeline's row

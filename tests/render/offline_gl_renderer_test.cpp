@@ -9,6 +9,7 @@
 #include <set>
 
 #include "camera/camera.h"
+#include "camera/zxy_camera_path.h"
 #include "platform/log.h"
 #include "platform/user_defaults.h"
 #include "render/gl/image_file.h"
@@ -216,6 +217,24 @@ TEST_F(OfflineRendererTest, TheScreenshotGoesToTheSavePathWithTheNameAppendedAsI
   const auto shot = gl::readTiff(dir / "shotsout.tiff");
   ASSERT_TRUE(shot);
   EXPECT_EQ(rgbAt(*shot, 5, 6), (std::array{0, 0, 255}));
+}
+
+TEST_F(OfflineRendererTest, ACameraPathRendersEachOfItsFramesIntoTheSavePath) {
+  document.addLayer(layerOf({{32, 16, 255, 255, 255}}));
+  UserDefaults::standardUserDefaults().setObjectForKey(dir.path().string(), "KTImageSavePath");
+  // Three poses at the origin looking down -z.
+  const auto path = ZXYCameraPath::initWithText("3\n0 0 0 0 0 0\n0 0 0 0 0 0\n0 0 0 0 0 0\n");
+  ASSERT_TRUE(path);
+  const CapturedLog log;
+  EXPECT_EQ(renderCameraPathOfDocument(*path, document, 45.0, 1.0f, 30.0f), 3);
+  EXPECT_EQ(filesWritten(), (std::set<std::string>{"out_0000.tiff", "out_0001.tiff",
+                                                   "out_0002.tiff"}));
+  const auto frame = gl::readTiff(dir / "out_0002.tiff");
+  ASSERT_TRUE(frame);
+  EXPECT_EQ(frame->width, 720);
+  EXPECT_EQ(frame->height, 480);
+  // Three small frames take well under a second: the rate is infinite.
+  EXPECT_EQ(log.count("Rendered 3 frames in 0 seconds, FPS:inf"), 1);
 }
 
 TEST(FramePattern, OnlyOneIntegerConversionIsAccepted) {

@@ -19,6 +19,8 @@
 #include "timeline/float_value_track.h"
 #include "timeline/render_run.h"
 #include "timeline/timeline.h"
+#include "timeline/timeline_window_controller.h"
+#include "render/render_properties_controller.h"
 
 namespace cloudreel {
 namespace {
@@ -196,6 +198,36 @@ TEST_F(RenderRunTest, CancelStopsBeforeTheNextFrameAfterFinishingTheOneInFlight)
   EXPECT_TRUE(*cancelled);
   EXPECT_EQ(filesWritten(), (std::set<std::string>{"out_0001.tiff"}));
   EXPECT_TRUE(document.enableViewUpdates());
+}
+
+// The timeline window's render: the settings sheet's values, the marked
+// range, the cursor following each frame, the progress sheet's label.
+TEST_F(RenderRunTest, TheTimelineWindowRendersTheMarkedRangeWithTheSheetsSettings) {
+  TimelineWindowController controller(loop);
+  controller.setDocument(&document);
+  document.timeline()->setInPoint(0.2f);
+  document.timeline()->setOutPoint(0.5f);
+  RenderPropertiesController settings;
+  settings.setWidth(24);
+  settings.setHeight(16);
+  settings.setRenderRangeSelected(static_cast<int>(RenderRange::Marks));
+  settings.setOutputPath(dir.path().string());
+  settings.setOutputPattern(*FramePattern::parse("f%d.tif"));
+  settings.setShouldRenderDepth(true);
+  const auto progress = std::make_shared<RenderProgressController>();
+  const auto run = controller.renderTimeline(settings, progress, [this](bool c) { cancelled = c; });
+  ASSERT_TRUE(run);
+  ASSERT_TRUE(loop.runUntil([&] { return cancelled.has_value(); }, 60s));
+  // truncate(10 × 0.2 - 1) + 1 = 2 to truncate(10 × 0.5) = 5.
+  EXPECT_EQ(filesWritten(), (std::set<std::string>{"f2.tif", "f3.tif", "f4.tif", "f5.tif",
+                                                    "depth_f2.tif", "depth_f3.tif",
+                                                    "depth_f4.tif", "depth_f5.tif"}));
+  EXPECT_EQ(progress->label(), "frame 5 of 5");
+  EXPECT_FLOAT_EQ(controller.cursor(), 0.5f);
+  EXPECT_FLOAT_EQ(layer->pointSize(), 6.0f);
+  const auto frame = gl::readTiff(dir / "f2.tif");
+  ASSERT_TRUE(frame);
+  EXPECT_EQ(frame->width, 24);
 }
 
 }  // namespace
