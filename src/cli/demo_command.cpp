@@ -20,6 +20,7 @@
 #include "cli/document_input.h"
 #include "cli/point_cloud_input.h"
 #include "cli/render_command.h"
+#include "cli/render_plan.h"
 #include "geometry/vector3.h"
 #include "platform/atomic_file.h"
 #include "platform/color.h"

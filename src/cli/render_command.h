@@ -44,11 +44,6 @@ struct RenderCommandOptions {
   std::string progress = "auto";
 };
 
-// Reads a frame size: a preset's label in any case, or WIDTHxHEIGHT with
-// each from 1 to 32768; empty gives preset 0. On failure `why` is the
-// one-line reason, listing the presets.
-bool parseRenderSize(const std::string& text, int& width, int& height, std::string& why);
-
 // Adds the subcommand, which fills `options` when parsed.
 CLI::App* addRenderCommand(CLI::App& app, RenderCommandOptions& options);
 

@@ -120,14 +120,20 @@ std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExport
 }
 
 std::vector<std::filesystem::path> OfflineGLRenderer::pathsForFrame(int frame) const {
-  const std::string name = outputPattern_.format(frame);
-  if (isStereoRender_) {
-    return {outputPath_ / ("L_" + name), outputPath_ / ("R_" + name)};
+  return pathsForFrame(outputPath_, outputPattern_, isDepthRender_, isStereoRender_, frame);
+}
+
+std::vector<std::filesystem::path> OfflineGLRenderer::pathsForFrame(
+    const std::filesystem::path& folder, const FramePattern& pattern, bool depth, bool stereo,
+    int frame) {
+  const std::string name = pattern.format(frame);
+  if (stereo) {
+    return {folder / ("L_" + name), folder / ("R_" + name)};
   }
-  if (isDepthRender_) {
-    return {outputPath_ / name, outputPath_ / ("depth_" + name)};
+  if (depth) {
+    return {folder / name, folder / ("depth_" + name)};
   }
-  return {outputPath_ / name};
+  return {folder / name};
 }
 
 bool OfflineGLRenderer::renderFrameOfDocumentForCamera(int frame, MyDocument& document,

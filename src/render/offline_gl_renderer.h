@@ -96,6 +96,12 @@ class OfflineGLRenderer {
 
   // The files frame `frame` writes, in the order written.
   std::vector<std::filesystem::path> pathsForFrame(int frame) const;
+  // The same for any renderer's settings: the pattern's name in the
+  // folder, then "depth_" + that name when rendering depth; in stereo only
+  // "L_" and "R_" + that name.
+  static std::vector<std::filesystem::path> pathsForFrame(const std::filesystem::path& folder,
+                                                          const FramePattern& pattern,
+                                                          bool depth, bool stereo, int frame);
 
   gl::GLContext& context() { return *context_; }
   const OpenGLScene& scene() const { return scene_; }
