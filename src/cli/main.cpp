@@ -7,6 +7,7 @@
 
 #include "cli/convert_command.h"
 #include "cli/demo_command.h"
+#include "cli/farm_command.h"
 #include "cli/import_command.h"
 #include "cli/info_command.h"
 #include "cli/render_command.h"
@@ -33,6 +34,8 @@ int main(int argc, char** argv) {
   const CLI::App* importCommand = cloudreel::cli::addImportCommand(app, import);
   cloudreel::cli::RenderCommandOptions render;
   const CLI::App* renderCommand = cloudreel::cli::addRenderCommand(app, render);
+  cloudreel::cli::FarmOptions farm;
+  const CLI::App* farmCommand = cloudreel::cli::addFarmCommand(app, farm);
   cloudreel::cli::DemoOptions demo;
   const CLI::App* demoCommand = cloudreel::cli::addDemoCommand(app, demo);
 
@@ -49,6 +52,9 @@ int main(int argc, char** argv) {
   }
   if (renderCommand->parsed()) {
     return cloudreel::cli::runRenderCommand(render);
+  }
+  if (farmCommand->parsed()) {
+    return cloudreel::cli::runFarmCommand(farm);
   }
   if (demoCommand->parsed()) {
     return cloudreel::cli::runDemoCommand(demo);
