@@ -1,6 +1,5 @@
 #include "cli/farm_command.h"
 
-#include <CLI/CLI.hpp>
 #include <fcntl.h>
 #include <fmt/format.h>
 #include <fmt/ranges.h>
@@ -8,6 +7,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <CLI/CLI.hpp>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
@@ -173,9 +173,8 @@ std::vector<Chunk> chunksOf(const std::vector<int>& frames, int size) {
 
 bool frameIsThere(const RenderPlan& plan, const RenderCommandOptions& render,
                   const fs::path& folder, int frame) {
-  for (const fs::path& file :
-       OfflineGLRenderer::pathsForFrame(folder, plan.pattern, render.depth,
-                                        render.stereoSeparation.has_value(), frame)) {
+  for (const fs::path& file : OfflineGLRenderer::pathsForFrame(
+           folder, plan.pattern, render.depth, render.stereoSeparation.has_value(), frame)) {
     if (!fs::is_regular_file(file)) {
       return false;
     }
@@ -227,8 +226,8 @@ std::string batchScript(const FarmOptions& options, const fs::path& program,
     script += (i == 0 ? "" : " ") + chunks[i].text();
   }
   script += ")\n";
-  std::string command = shellQuote(program.string()) + " render " +
-                        shellQuote(document.string()) + " --out " + shellQuote(out.string()) +
+  std::string command = shellQuote(program.string()) + " render " + shellQuote(document.string()) +
+                        " --out " + shellQuote(out.string()) +
                         " --frames \"${chunks[$SLURM_ARRAY_TASK_ID]}\" --skip-existing";
   for (const std::string& arg : renderArguments(options.render)) {
     command += " " + shellQuote(arg);
@@ -292,16 +291,16 @@ int waitForJob(const std::string& jobId, const fs::path& squeue, const FarmOptio
                    task, chunks[task].text().c_str(), log.c_str());
     } else {
       const std::string why = lastLine(readText(log));
-      std::fprintf(stderr, "cloudreel farm: task %zu (frames %s) failed with status %s%s%s\n",
-                   task, chunks[task].text().c_str(), status.c_str(), why.empty() ? "" : ": ",
+      std::fprintf(stderr, "cloudreel farm: task %zu (frames %s) failed with status %s%s%s\n", task,
+                   chunks[task].text().c_str(), status.c_str(), why.empty() ? "" : ": ",
                    why.c_str());
     }
   }
   const int done = countDone();
-  std::fprintf(stderr, "job %s ended: %d of %d frames in %s%s\n", jobId.c_str(), done, frameCount,
-               out.c_str(),
-               failed > 0 ? fmt::format(", {} of {} tasks failed", failed, chunks.size()).c_str()
-                          : "");
+  std::fprintf(
+      stderr, "job %s ended: %d of %d frames in %s%s\n", jobId.c_str(), done, frameCount,
+      out.c_str(),
+      failed > 0 ? fmt::format(", {} of {} tasks failed", failed, chunks.size()).c_str() : "");
   return failed > 0 || done < frameCount ? kRenderExitFramesNotWritten : kRenderExitOk;
 }
 
@@ -312,10 +311,10 @@ CLI::App* addFarmCommand(CLI::App& app, FarmOptions& options) {
       "farm",
       "Render a document on a Slurm cluster: the frames split into chunks, one array job "
       "running `cloudreel render` on each chunk into the same folder.");
-  command->add_option("DOC", options.render.document, "the .reel document to render")
-      ->required();
-  command->add_option("--out", options.render.outputFolder,
-                      "the folder for the frames, reachable from the compute nodes")
+  command->add_option("DOC", options.render.document, "the .reel document to render")->required();
+  command
+      ->add_option("--out", options.render.outputFolder,
+                   "the folder for the frames, reachable from the compute nodes")
       ->required();
   addRenderOptions(*command, options.render);
   command->add_option("--chunk", options.chunk, "frames a task renders")
@@ -335,8 +334,7 @@ CLI::App* addFarmCommand(CLI::App& app, FarmOptions& options) {
   command->add_flag("--wait", options.wait,
                     "follow the job to its end, showing frames as they appear; exit non-zero "
                     "naming the chunks that failed");
-  command->add_flag("--dry-run", options.dryRun,
-                    "print the batch script instead of submitting it");
+  command->add_flag("--dry-run", options.dryRun, "print the batch script instead of submitting it");
   command->footer(
       "Exit status: 0 submitted (with --wait: every frame written); 1 bad input or no sbatch; "
       "2 (with --wait) some tasks failed, each named; 4 sbatch refused the job.");
@@ -358,8 +356,8 @@ int runFarmCommand(const FarmOptions& options) {
   const fs::path documentPath = absoluteClean(options.render.document);
   const fs::path out = absoluteClean(options.render.outputFolder);
   std::error_code ec;
-  const fs::path program =
-      options.program.empty() ? fs::read_symlink("/proc/self/exe", ec) : absoluteClean(options.program);
+  const fs::path program = options.program.empty() ? fs::read_symlink("/proc/self/exe", ec)
+                                                   : absoluteClean(options.program);
 
   // The tasks read these on the compute nodes: they must lie where the
   // nodes see the same files.
@@ -378,8 +376,8 @@ int runFarmCommand(const FarmOptions& options) {
       }
       if (!shared) {
         return refuse(fmt::format(
-            "{} {} is outside the shared folders ({}): the compute nodes could not read it",
-            what, path.string(), fmt::join(options.sharedRoots, ", ")));
+            "{} {} is outside the shared folders ({}): the compute nodes could not read it", what,
+            path.string(), fmt::join(options.sharedRoots, ", ")));
       }
     }
   }

@@ -1,9 +1,9 @@
 #include "cli/render_command.h"
 
-#include <CLI/CLI.hpp>
 #include <fmt/format.h>
 #include <unistd.h>
 
+#include <CLI/CLI.hpp>
 #include <atomic>
 #include <chrono>
 #include <csignal>
@@ -63,9 +63,10 @@ CLI::App* addRenderCommand(CLI::App& app, RenderCommandOptions& options) {
   command->add_option("--out", options.outputFolder, "the folder for the frames (made if missing)")
       ->required();
   addRenderOptions(*command, options);
-  command->add_option("--progress", options.progress,
-                      "auto (a live line on a terminal, plain lines otherwise), plain, or json "
-                      "(one object a frame on standard output)")
+  command
+      ->add_option("--progress", options.progress,
+                   "auto (a live line on a terminal, plain lines otherwise), plain, or json "
+                   "(one object a frame on standard output)")
       ->check(CLI::IsMember({"auto", "plain", "json"}))
       ->capture_default_str();
   command->footer(
@@ -112,7 +113,8 @@ int renderDocument(MyDocument& document, const RenderCommandOptions& options) {
   if (context) {
     renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
         OpenGLScene::initWithWidthHeightFieldOfViewZNearZFar(
-            plan->width, plan->height, sceneCamera ? sceneCamera->fieldOfView() : 45.0, 1.0f, 30.0f),
+            plan->width, plan->height, sceneCamera ? sceneCamera->fieldOfView() : 45.0, 1.0f,
+            30.0f),
         *context, options.depth, &error);
   } else {
     error.message = "No OpenGL context for rendering";
@@ -127,8 +129,7 @@ int renderDocument(MyDocument& document, const RenderCommandOptions& options) {
   renderer->setStereoSeparation(options.stereoSeparation.value_or(0.0f));
   OfflineGLRenderer& frames = *renderer;
 
-  RenderProgressLine progress(RenderProgressLine::styleNamed(options.progress),
-                              range.frameCount());
+  RenderProgressLine progress(RenderProgressLine::styleNamed(options.progress), range.frameCount());
   int unwritten = 0;
   bool cancelledRun = false;
   bool done = false;

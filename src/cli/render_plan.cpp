@@ -1,8 +1,8 @@
 #include "cli/render_plan.h"
 
-#include <CLI/CLI.hpp>
 #include <fmt/format.h>
 
+#include <CLI/CLI.hpp>
 #include <charconv>
 #include <cmath>
 
@@ -50,8 +50,8 @@ std::shared_ptr<CameraPath> findCameraPath(const MyDocument& document, const std
       }
     }
   }
-  why = "No camera path \"" + key + "\" in the document (it has " +
-        std::to_string(paths.size()) + "; `cloudreel info` lists them, counted from 0)";
+  why = "No camera path \"" + key + "\" in the document (it has " + std::to_string(paths.size()) +
+        "; `cloudreel info` lists them, counted from 0)";
   return nullptr;
 }
 
@@ -131,8 +131,8 @@ std::optional<RenderPlan> planRender(const MyDocument& document,
     if (plan.range.firstFrame() < plan.available.firstFrame() ||
         plan.range.last > plan.available.last) {
       why = fmt::format("Frames {} are outside the {} (frames {}-{})", options.frames,
-                        plan.cameraPath ? "camera path" : "timeline",
-                        plan.available.firstFrame(), plan.available.last);
+                        plan.cameraPath ? "camera path" : "timeline", plan.available.firstFrame(),
+                        plan.available.last);
       return std::nullopt;
     }
   }
@@ -158,8 +158,9 @@ void addRenderOptions(CLI::App& command, RenderCommandOptions& options) {
   command.add_option("--stereo", options.stereoSeparation,
                      "write a left and a right image a frame (L_ and R_ + the frame's name) with "
                      "this eye separation (the application's default is 0.2)");
-  command.add_option("--pattern", options.pattern,
-                     "frame file names: a printf format with one integer conversion")
+  command
+      .add_option("--pattern", options.pattern,
+                  "frame file names: a printf format with one integer conversion")
       ->capture_default_str();
   command.add_option("--camera-path", options.cameraPath,
                      "render through a camera path's frames instead of the timeline: its name, "

@@ -105,7 +105,8 @@ void RenderRun::frameDrawn(const std::shared_ptr<OfflineGLRenderer::DrawnFrame>&
           result->error = drawn->error;
         }
       },
-      mainLoop_, [self = shared_from_this(), frame = drawn->frame, result] {
+      mainLoop_,
+      [self = shared_from_this(), frame = drawn->frame, result] {
         self->frameWritten(frame, *result);
       });
   if (pendingWrites_ < kMostPendingWrites) {
