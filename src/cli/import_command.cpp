@@ -9,11 +9,11 @@
 #include <filesystem>
 #include <limits>
 #include <memory>
-#include <numbers>
 #include <optional>
 #include <system_error>
 
 #include "camera/camera_field.h"
+#include "camera/camera_framing.h"
 #include "camera/discrete_camera_path.h"
 #include "camera/scene_camera.h"
 #include "camera/zxy_camera_path.h"
@@ -21,7 +21,6 @@
 #include "cli/point_cloud_input.h"
 #include "cli/point_cloud_summary.h"
 #include "cli/standard_error_capture.h"
-#include "geometry/vector3.h"
 #include "platform/file_location.h"
 #include "scene/my_document.h"
 #include "scene/point_layer.h"
@@ -108,43 +107,9 @@ std::optional<Imported> importCameraPath(const std::filesystem::path& path, Erro
 std::optional<Layer::BoundingBox> unionOfBoxes(const std::vector<Imported>& layers) {
   std::optional<Layer::BoundingBox> total;
   for (const Imported& imported : layers) {
-    const Layer::BoundingBox& b = imported.layer->bbox();
-    const bool finite = std::all_of(b.begin(), b.end(), [](double v) { return std::isfinite(v); });
-    if (!finite || b[0] > b[3] || b[1] > b[4] || b[2] > b[5] ||
-        (b[0] == b[3] && b[1] == b[4] && b[2] == b[5])) {
-      continue;
-    }
-    if (!total) {
-      total = b;
-      continue;
-    }
-    for (std::size_t axis = 0; axis < 3; ++axis) {
-      (*total)[axis] = std::min((*total)[axis], b[axis]);
-      (*total)[axis + 3] = std::max((*total)[axis + 3], b[axis + 3]);
-    }
+    addBoxToUnion(total, imported.layer->bbox());
   }
   return total;
-}
-
-// Places the camera, keeping its orientation (looking down -z), on the
-// box's centre line and far enough back along +z that the box's bounding
-// sphere fits inside the narrower of its two fields of view, with a margin;
-// near and far planes close around the sphere.
-void frameBox(SceneCamera& camera, const Layer::BoundingBox& box) {
-  const double cx = (box[0] + box[3]) / 2, cy = (box[1] + box[4]) / 2, cz = (box[2] + box[5]) / 2;
-  const double radius = std::hypot(box[3] - box[0], box[4] - box[1], box[5] - box[2]) / 2;
-  double halfAngle = std::clamp(static_cast<double>(camera.fieldOfView()), 1.0, 179.0) / 2 *
-                     std::numbers::pi / 180;
-  // The field of view is the vertical one; a view narrower than tall sees
-  // less sideways.
-  if (const double aspect = camera.aspect(); aspect > 0 && aspect < 1) {
-    halfAngle = std::atan(aspect * std::tan(halfAngle));
-  }
-  const double distance = 1.1 * radius / std::sin(halfAngle);
-  camera.setTranslate(Vector3(cx, cy, cz + distance));
-  // distance > 1.1 × radius, so the near plane stays in front of the camera.
-  camera.setZNear(static_cast<float>(std::max((distance - radius) * 0.5, distance * 1e-4)));
-  camera.setZFar(static_cast<float>((distance + radius) * 1.5));
 }
 
 }  // namespace
@@ -238,7 +203,7 @@ int runImportCommand(const ImportOptions& options) {
 
   if (!exists && document.sceneCamera()) {
     if (const auto box = unionOfBoxes(imported)) {
-      frameBox(*document.sceneCamera(), *box);
+      frameBoxWithCamera(*document.sceneCamera(), *box);
     }
   }
   for (Imported& item : imported) {
