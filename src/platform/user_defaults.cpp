@@ -150,12 +150,14 @@ std::unique_ptr<UserDefaults> UserDefaults::setStandardUserDefaults(
 }
 
 void UserDefaults::registerDefaults(const DefaultsDictionary& values) {
+  const std::lock_guard lock(mutex_);
   for (const auto& [key, value] : values) {
     registered_.insert_or_assign(key, value);
   }
 }
 
 std::optional<DefaultsValue> UserDefaults::objectForKey(std::string_view key) const {
+  const std::lock_guard lock(mutex_);
   if (auto it = user_.find(key); it != user_.end()) {
     return it->second;
   }
@@ -192,17 +194,20 @@ Bytes UserDefaults::dataForKey(std::string_view key) const {
 }
 
 void UserDefaults::setObjectForKey(DefaultsValue value, std::string_view key) {
+  const std::lock_guard lock(mutex_);
   user_.insert_or_assign(std::string(key), std::move(value));
   save();
 }
 
 void UserDefaults::removeObjectForKey(std::string_view key) {
+  const std::lock_guard lock(mutex_);
   if (auto it = user_.find(key); it != user_.end()) {
     user_.erase(it);
     save();
   }
 }
 
+// Called with the lock held.
 void UserDefaults::save() {
   Error error;
   if (!store_->save(user_, &error)) {

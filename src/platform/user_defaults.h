@@ -10,6 +10,7 @@
 #include <filesystem>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -95,6 +96,10 @@ class UserDefaults {
   void save();
 
   std::unique_ptr<DefaultsStore> store_;
+  // Reads come from any thread (a layer made while a file is read in the
+  // background takes its point size and colour from here), writes from the
+  // main thread: every access to the two dictionaries holds the lock.
+  mutable std::mutex mutex_;
   DefaultsDictionary registered_;
   DefaultsDictionary user_;
 };
