@@ -58,16 +58,8 @@ PointFileKind pointFileKind(const std::filesystem::path& path) {
   for (char& c : extension) {
     c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
   }
-  if (extension == ".rwb") {
-    return PointFileKind::PointFile;
-  }
-  if (extension == ".ply") {
-    return PointFileKind::Ply;
-  }
-  if (extension == ".out") {
-    return PointFileKind::Bundler;
-  }
-  return PointFileKind::Unknown;
+  // The extension starts with its dot when there is one.
+  return pointFileKindForExtension(std::string_view(extension).substr(extension.empty() ? 0 : 1));
 }
 
 bool checkReadable(const std::filesystem::path& path, Error* error) {

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "platform/error.h"
+#include "scene/application_commands.h"
 
 namespace cloudreel {
 class PointLayer;
@@ -16,9 +17,9 @@ class PointLayer;
 
 namespace cloudreel::cli {
 
-enum class PointFileKind { Unknown, PointFile, Ply, Bundler };
-
-// By extension, in any case: ".rwb", ".ply" or ".out" (a bundle file).
+// By extension, in any case: ".rwb", ".ply" or ".out" (a bundle file). The
+// application's import takes only the lower-case names; the command line
+// forgives the case.
 PointFileKind pointFileKind(const std::filesystem::path& path);
 
 // Writes "cloudreel: <message>" as one line on standard error.
