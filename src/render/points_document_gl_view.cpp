@@ -35,15 +35,11 @@ Vec3 rotated(const Vec3& v, const AxisAngle& r) {
   if (!(len > 0) || r[0] == 0.0) {
     return v;
   }
-  const Vec3 k{r[1] / len, r[2] / len, r[3] / len};
-  const double a = r[0] * kRadiansPerDegree;
-  const double c = std::cos(a), s = std::sin(a);
-  const double dot = k[0] * v[0] + k[1] * v[1] + k[2] * v[2];
-  const Vec3 cross{k[1] * v[2] - k[2] * v[1], k[2] * v[0] - k[0] * v[2], k[0] * v[1] - k[1] * v[0]};
-  Vec3 out{};
-  for (std::size_t i = 0; i < 3; ++i) {
-    out[i] = v[i] * c + cross[i] * s + k[i] * dot * (1 - c);
-  }
+  // The transform's rotation takes radians and a unit axis.
+  Vec3 out = v;
+  AffineTransform::initWithAxisAngleRotation(
+      {r[0] * kRadiansPerDegree, r[1] / len, r[2] / len, r[3] / len})
+      ->multiply3Vector(out);
   return out;
 }
 

@@ -329,6 +329,25 @@ TEST_F(DocumentViewTest, TrackballDragsTurnTheFreeCameraAndRightDragsDolly) {
   EXPECT_FLOAT_EQ(view.orthoScale(), 1.0f);
 }
 
+// In a turned view a drag moves the layer along the view's own axes: the
+// "+X" preset turns 270 degrees about y, so the view's right is world -z.
+TEST_F(DocumentViewTest, ATranslateDragFollowsTheTurnedViewsAxes) {
+  auto layer = layerOf({{0, 0, 0}});
+  document.addLayer(layer);
+  view.reshape(kW, kH);
+  view.setEditMode(PointsDocumentGLView::kEditSelectedLayer);
+  view.cameraPreset(3);
+  std::array<double, 3> before{0, 0, 0};
+  layer->objectToWorld()->multiply3Vector(before);
+  view.mouseDown({60, 40});
+  view.mouseUp({80, 80});  // 20 pixels right and 40 up: 0.5 and 1 unit
+  std::array<double, 3> after{0, 0, 0};
+  layer->objectToWorld()->multiply3Vector(after);
+  EXPECT_NEAR(after[0] - before[0], 0.0, 1e-9);
+  EXPECT_NEAR(after[1] - before[1], 1.0, 1e-9);
+  EXPECT_NEAR(after[2] - before[2], -0.5, 1e-9);
+}
+
 TEST_F(DocumentViewTest, EditDragsCommitUnderTheirUndoNames) {
   auto layer = layerOf({{0, 0, 0}});
   document.addLayer(layer);
