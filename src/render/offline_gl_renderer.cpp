@@ -261,18 +261,23 @@ bool OfflineGLRenderer::readColorFrame(gl::RgbaImage& out, Error* error) {
   return framebuffer_ && framebuffer_->readColor(out, error);
 }
 
+// The design's single-file saves, as a drawn frame of one file each.
 bool OfflineGLRenderer::saveColorFrame(const std::filesystem::path& path, Error* error) {
-  if (!readColorFrame(bitmap_, error)) {
+  DrawnFrame drawn;
+  drawn.colour.push_back({path, spareColourImage()});
+  if (!readColorFrame(drawn.colour.back().image, error)) {
     return false;
   }
-  return gl::writeColorTiff(path, bitmap_, error);
+  return writeDrawnFrame(drawn, error);
 }
 
 bool OfflineGLRenderer::saveDepthFrame(const std::filesystem::path& path, Error* error) {
-  if (!framebuffer_ || !framebuffer_->readDepth(depthBitmap_, error)) {
+  DrawnFrame drawn;
+  drawn.depth = DrawnFrame::DepthFile{path, spareDepthImage()};
+  if (!framebuffer_ || !framebuffer_->readDepth(drawn.depth->image, error)) {
     return false;
   }
-  return gl::writeDepthTiff(path, depthBitmap_, error);
+  return writeDrawnFrame(drawn, error);
 }
 
 int renderCameraPathOfDocument(const CameraPath& path, MyDocument& document, double fieldOfView,

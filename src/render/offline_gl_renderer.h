@@ -37,8 +37,7 @@ class OfflineGLRenderer {
   // images cannot be made; the reason is logged ("Framebuffer not complete!
   // %x", "OpenGL Error: %04x after init") and given in `error`.
   [[nodiscard]] static std::unique_ptr<OfflineGLRenderer> initWithSceneContextExportDepth(
-      const OpenGLScene& scene, gl::GLContext& shareWith, bool exportDepth,
-      Error* error = nullptr);
+      const OpenGLScene& scene, gl::GLContext& shareWith, bool exportDepth, Error* error = nullptr);
   ~OfflineGLRenderer();
   OfflineGLRenderer(const OfflineGLRenderer&) = delete;
   OfflineGLRenderer& operator=(const OfflineGLRenderer&) = delete;
@@ -90,8 +89,8 @@ class OfflineGLRenderer {
   // Read back what was drawn, top row first, and write it atomically.
   bool saveColorFrame(const std::filesystem::path& path, Error* error = nullptr);
   bool saveDepthFrame(const std::filesystem::path& path, Error* error = nullptr);
-  // Reads the last drawn colour frame into memory instead (the renderer's
-  // own bitmap, RGBA, top row first); false without a current context.
+  // Reads the last drawn colour frame into `out` instead (RGBA, top row
+  // first); false without a current context.
   bool readColorFrame(gl::RgbaImage& out, Error* error = nullptr);
 
   // The files frame `frame` writes, in the order written.
@@ -100,8 +99,8 @@ class OfflineGLRenderer {
   // folder, then "depth_" + that name when rendering depth; in stereo only
   // "L_" and "R_" + that name.
   static std::vector<std::filesystem::path> pathsForFrame(const std::filesystem::path& folder,
-                                                          const FramePattern& pattern,
-                                                          bool depth, bool stereo, int frame);
+                                                          const FramePattern& pattern, bool depth,
+                                                          bool stereo, int frame);
 
   gl::GLContext& context() { return *context_; }
   const OpenGLScene& scene() const { return scene_; }
@@ -132,8 +131,6 @@ class OfflineGLRenderer {
   bool isDepthRender_ = false;
   bool isStereoRender_ = false;
   float stereoSeparation_ = 0.0f;
-  gl::RgbaImage bitmap_;
-  gl::DepthImage depthBitmap_;
   // Read-back images of written frames, kept so that a render allocates its
   // images once (two frames' worth when writing overlaps drawing).
   std::mutex spareMutex_;

@@ -1,6 +1,8 @@
 // Off-screen frames as files: where known points land in the TIFFs read back
 // from disk, their colours and depth, the stereo pair's shift, the names the
 // files get, and what a failure to make or write them does.
+#include "render/offline_gl_renderer.h"
+
 #include <epoxy/gl.h>
 #include <gtest/gtest.h>
 
@@ -13,7 +15,6 @@
 #include "platform/log.h"
 #include "platform/user_defaults.h"
 #include "render/gl/image_file.h"
-#include "render/offline_gl_renderer.h"
 #include "render/render_properties_controller.h"
 #include "scene/my_document.h"
 #include "scene/point_layer.h"
@@ -83,13 +84,7 @@ class OfflineRendererTest : public testing::PixelTest {
     }
     return made;
   }
-  std::set<std::string> filesWritten() const {
-    std::set<std::string> names;
-    for (const auto& entry : fs::directory_iterator(dir.path())) {
-      names.insert(entry.path().filename().string());
-    }
-    return names;
-  }
+  std::set<std::string> filesWritten() const { return testing::fileNamesIn(dir.path()); }
   static std::array<int, 3> rgbAt(const gl::TiffImage& image, int x, int y) {
     return {image.sample(x, y, 0), image.sample(x, y, 1), image.sample(x, y, 2)};
   }
@@ -148,6 +143,12 @@ TEST_F(OfflineRendererTest, AFrameLandsWherePointsProjectWithTheirColoursAndDept
   ASSERT_TRUE(r->readColorFrame(image));
   const auto* pixel = &image.pixels[(8 * kWidth + 48) * 4];
   EXPECT_EQ((std::array{pixel[0], pixel[1], pixel[2]}), (std::array<std::uint8_t, 3>{255, 0, 0}));
+  // And saved file by file: the same bytes as the frame's own files.
+  ASSERT_TRUE(r->saveColorFrame(dir / "again.tiff"));
+  ASSERT_TRUE(r->saveDepthFrame(dir / "depth_again.tiff"));
+  EXPECT_EQ(testing::readFile(dir / "again.tiff"), testing::readFile(dir / "output_0007.tiff"));
+  EXPECT_EQ(testing::readFile(dir / "depth_again.tiff"),
+            testing::readFile(dir / "depth_output_0007.tiff"));
 }
 
 TEST_F(OfflineRendererTest, AStereoPairShiftsTheFrustumAndWritesOnlyLeftAndRight) {
@@ -227,8 +228,8 @@ TEST_F(OfflineRendererTest, ACameraPathRendersEachOfItsFramesIntoTheSavePath) {
   ASSERT_TRUE(path);
   const CapturedLog log;
   EXPECT_EQ(renderCameraPathOfDocument(*path, document, 45.0, 1.0f, 30.0f), 3);
-  EXPECT_EQ(filesWritten(), (std::set<std::string>{"out_0000.tiff", "out_0001.tiff",
-                                                   "out_0002.tiff"}));
+  EXPECT_EQ(filesWritten(),
+            (std::set<std::string>{"out_0000.tiff", "out_0001.tiff", "out_0002.tiff"}));
   const auto frame = gl::readTiff(dir / "out_0002.tiff");
   ASSERT_TRUE(frame);
   EXPECT_EQ(frame->width, 720);
