@@ -11,9 +11,9 @@
 #include <cstdio>
 #include <memory>
 #include <optional>
-#include <random>
 #include <string>
 
+#include "random_cloud.h"
 #include "render/gl/display_list.h"
 #include "render/gl/egl_context.h"
 #include "render/gl/framebuffer.h"
@@ -55,21 +55,7 @@ std::shared_ptr<PointLayer> cloudOf(std::int32_t n) {
     return layer;
   }
   layer.reset();
-  layer = std::make_shared<PointLayer>();
-  layer->allocatePointArrayWithSize(n);
-  layer->setNPoints(n);
-  std::mt19937 random(7);
-  std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
-  for (color_point& p : layer->colorPoints()) {
-    p = {unit(random),
-         unit(random),
-         unit(random),
-         static_cast<std::uint8_t>(random()),
-         static_cast<std::uint8_t>(random()),
-         static_cast<std::uint8_t>(random()),
-         static_cast<std::uint8_t>(random() % 255)};
-  }
-  layer->setPointSize(1.0f);
+  layer = bench::randomCloud(n);
   return layer;
 }
 

@@ -16,13 +16,13 @@
 #include <filesystem>
 #include <map>
 #include <memory>
-#include <random>
 #include <string>
 
 #include "bench_files.h"
 #include "camera/camera.h"
 #include "platform/application_defaults.h"
 #include "platform/log.h"
+#include "random_cloud.h"
 #include "render/gl/egl_context.h"
 #include "render/offline_gl_renderer.h"
 #include "scene/my_document.h"
@@ -70,22 +70,7 @@ struct Scene {
   std::string error;
 
   Scene(std::int32_t n, bool depth) {
-    auto layer = std::make_shared<PointLayer>();
-    layer->allocatePointArrayWithSize(n);
-    layer->setNPoints(n);
-    std::mt19937 random(7);
-    std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
-    for (color_point& p : layer->colorPoints()) {
-      p = {unit(random),
-           unit(random),
-           unit(random) - 3.0f,
-           static_cast<std::uint8_t>(random()),
-           static_cast<std::uint8_t>(random()),
-           static_cast<std::uint8_t>(random()),
-           static_cast<std::uint8_t>(random() % 255)};
-    }
-    layer->setPointSize(1.0f);
-    document.addLayer(layer);
+    document.addLayer(bench::randomCloud(n, -3.0f));
     camera->setFieldOfView(45.0f);
     camera->setZNear(1.0f);
     camera->setZFar(10.0f);
@@ -195,12 +180,16 @@ void BM_RenderRun(benchmark::State& state) {
     frames->start();
     (void)loop.runUntil([&] { return done; }, std::chrono::hours(1));
   });
-  state.counters["frames/s"] = benchmark::Counter(
-      static_cast<double>(state.iterations() * kFrames), benchmark::Counter::kIsRate);
+  state.counters["frames/s"] = benchmark::Counter(static_cast<double>(state.iterations() * kFrames),
+                                                  benchmark::Counter::kIsRate);
 }
 
 BENCHMARK(BM_DrawOnly)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
-BENCHMARK(BM_DrawAndReadBack)->Arg(1'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->MinTime(3);
+BENCHMARK(BM_DrawAndReadBack)
+    ->Arg(1'000'000)
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->MinTime(3);
 BENCHMARK(BM_WholeFrame)
     ->Args({1'000'000, 0})
     ->Args({1'000'000, 1})
@@ -213,8 +202,16 @@ BENCHMARK(BM_RenderRun)
     ->Unit(benchmark::kMillisecond)
     ->UseRealTime()
     ->MinTime(3);
-BENCHMARK(BM_DrawOnly)->Arg(10'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->Iterations(3);
-BENCHMARK(BM_DrawAndReadBack)->Arg(10'000'000)->Unit(benchmark::kMillisecond)->UseRealTime()->Iterations(3);
+BENCHMARK(BM_DrawOnly)
+    ->Arg(10'000'000)
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->Iterations(3);
+BENCHMARK(BM_DrawAndReadBack)
+    ->Arg(10'000'000)
+    ->Unit(benchmark::kMillisecond)
+    ->UseRealTime()
+    ->Iterations(3);
 BENCHMARK(BM_WholeFrame)
     ->Args({10'000'000, 0})
     ->Args({10'000'000, 1})

@@ -11,8 +11,8 @@
 #include <set>
 #include <sstream>
 
+#include "cli/scene_document.h"
 #include "support/cli_runner.h"
-#include "support/ply_text.h"
 #include "support/temp_dir.h"
 
 namespace cloudreel {
@@ -22,18 +22,6 @@ using testing::cloudreel;
 using testing::Outcome;
 using testing::TempDir;
 namespace fs = std::filesystem;
-
-// A small document whose timeline has frames 0 to 25.
-void makeDocument(const TempDir& dir) {
-  testing::PlyElement vertex{"vertex", testing::kPlyXyzRgb, {}};
-  for (int i = 0; i < 300; ++i) {
-    vertex.instances.push_back(
-        {(i % 20) / 10.0 - 1, (i / 20) / 10.0 - 1, (i % 3) / 3.0, 90.0, double(i % 256), 200.0});
-  }
-  testing::writeFile(dir / "cloud.ply", testing::plyText({vertex}, "ascii"));
-  const Outcome made = cloudreel(dir, {"import", "scene.reel", "cloud.ply"});
-  ASSERT_EQ(made.status, 0) << made.err;
-}
 
 // Sets an environment variable for the life of the object.
 class ScopedEnv {
@@ -61,7 +49,7 @@ class ScopedEnv {
 
 TEST(CliFarm, ADryRunPrintsTheArrayJobAndSubmitsNothing) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   const Outcome run = cloudreel(
       dir, {"farm", "scene.reel", "--out", "frames", "--frames", "3-24", "--chunk", "10",
             "--partition", "gpu", "--time", "0:30:00", "--sbatch-arg=--gres=gpu:1", "--size",
@@ -69,11 +57,11 @@ TEST(CliFarm, ADryRunPrintsTheArrayJobAndSubmitsNothing) {
   ASSERT_EQ(run.status, 0) << run.err;
   for (const std::string& line : std::vector<std::string>{
            "#SBATCH --array=0-2\n", "#SBATCH --partition=gpu\n", "#SBATCH --time=0:30:00\n",
-        "#SBATCH --gres=gpu:1\n", "chunks=(3-12 13-22 23-24)\n",
-        " render " + (dir / "scene.reel").string() + " --out " + (dir / "frames").string(),
-        "--frames \"${chunks[$SLURM_ARRAY_TASK_ID]}\" --skip-existing --size 'PAL Square Pixel' "
-        "--depth --pattern 'shot %03d.tif'",
-        "#SBATCH --output=" + (dir / "frames/cloudreel-farm/%A_%a.log").string()}) {
+           "#SBATCH --gres=gpu:1\n", "chunks=(3-12 13-22 23-24)\n",
+           " render " + (dir / "scene.reel").string() + " --out " + (dir / "frames").string(),
+           "--frames \"${chunks[$SLURM_ARRAY_TASK_ID]}\" --skip-existing --size 'PAL Square Pixel' "
+           "--depth --pattern 'shot %03d.tif'",
+           "#SBATCH --output=" + (dir / "frames/cloudreel-farm/%A_%a.log").string()}) {
     EXPECT_NE(run.out.find(line), std::string::npos) << line << "\nin\n" << run.out;
   }
   EXPECT_FALSE(fs::exists(dir / "frames"));
@@ -81,7 +69,7 @@ TEST(CliFarm, ADryRunPrintsTheArrayJobAndSubmitsNothing) {
 
 TEST(CliFarm, RefusesWhatTheNodesCouldNotReadAndAMissingSbatch) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   Outcome run = cloudreel(dir, {"farm", "scene.reel", "--out", "frames", "--shared-root",
                                 (dir / "elsewhere").string(), "--dry-run"});
   EXPECT_EQ(run.status, 1);
@@ -138,9 +126,9 @@ class LocalCluster : public ::testing::Test {
   static void TearDownTestSuite() {
     if (state_ != nullptr) {
       const ScopedEnv where("CLOUDREEL_SLURM_DIR", (state_->path() / "slurm").string());
-      (void)testing::runProgram(state_->path(),
-                                {(fs::path(CLOUDREEL_SOURCE_DIR) / "scripts/local-slurm").string(),
-                                 "stop"});
+      (void)testing::runProgram(
+          state_->path(),
+          {(fs::path(CLOUDREEL_SOURCE_DIR) / "scripts/local-slurm").string(), "stop"});
       delete state_;
       state_ = nullptr;
     }
@@ -165,11 +153,11 @@ class LocalCluster : public ::testing::Test {
 // render's, a resubmission of the missing ones, and failing tasks.
 TEST_F(LocalCluster, FramesRenderedOnTheClusterAreThoseOfALocalRender) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   using Clock = std::chrono::steady_clock;
   Clock::time_point start = Clock::now();
-  Outcome run = cloudreel(dir, {"farm", "scene.reel", "--out", "farm", "--frames", "0-6",
-                                "--chunk", "3", "--size", "64x48", "--depth", "--wait"});
+  Outcome run = cloudreel(dir, {"farm", "scene.reel", "--out", "farm", "--frames", "0-6", "--chunk",
+                                "3", "--size", "64x48", "--depth", "--wait"});
   const double farmSeconds = std::chrono::duration<double>(Clock::now() - start).count();
   ASSERT_EQ(run.status, 0) << run.err;
   EXPECT_NE(run.err.find("7 frames in 3 tasks"), std::string::npos) << run.err;
@@ -200,13 +188,11 @@ TEST_F(LocalCluster, FramesRenderedOnTheClusterAreThoseOfALocalRender) {
   EXPECT_EQ(readBytes(dir / "farm/output_0004.tiff"), readBytes(dir / "local/output_0004.tiff"));
 
   // Tasks whose program fails at once are named with their frames.
-  run = cloudreel(dir, {"farm", "scene.reel", "--out", "failing", "--frames", "0-3", "--chunk",
-                        "2", "--size", "16x16", "--cloudreel", "/bin/false", "--wait"});
+  run = cloudreel(dir, {"farm", "scene.reel", "--out", "failing", "--frames", "0-3", "--chunk", "2",
+                        "--size", "16x16", "--cloudreel", "/bin/false", "--wait"});
   EXPECT_EQ(run.status, 2);
-  EXPECT_NE(run.err.find("task 0 (frames 0-1) failed with status 1"), std::string::npos)
-      << run.err;
-  EXPECT_NE(run.err.find("task 1 (frames 2-3) failed with status 1"), std::string::npos)
-      << run.err;
+  EXPECT_NE(run.err.find("task 0 (frames 0-1) failed with status 1"), std::string::npos) << run.err;
+  EXPECT_NE(run.err.find("task 1 (frames 2-3) failed with status 1"), std::string::npos) << run.err;
 }
 
 }  // namespace

@@ -13,9 +13,9 @@
 #include <sstream>
 #include <thread>
 
+#include "cli/scene_document.h"
 #include "render/gl/image_file.h"
 #include "support/cli_runner.h"
-#include "support/ply_text.h"
 #include "support/temp_dir.h"
 
 namespace cloudreel {
@@ -25,32 +25,6 @@ using testing::cloudreel;
 using testing::Outcome;
 using testing::TempDir;
 namespace fs = std::filesystem;
-
-// A document holding a coloured cloud of 400 points in a 2 × 2 × 2 cube,
-// its camera placed by the import to see all of it, and a path of two
-// cameras.
-void makeDocument(const TempDir& dir) {
-  testing::PlyElement vertex{"vertex", testing::kPlyXyzRgb, {}};
-  for (int i = 0; i < 400; ++i) {
-    vertex.instances.push_back({(i % 20) / 10.0 - 1, (i / 20) / 10.0 - 1, (i % 7) / 3.0 - 1,
-                                200.0, double(i % 256), 50.0});
-  }
-  testing::writeFile(dir / "cloud.ply", testing::plyText({vertex}, "ascii"));
-  testing::writeFile(dir / "path.txt", "2\n0 0 8 0 0 0\n1 0 8 0 0 0\n");
-  const Outcome made =
-      cloudreel(dir, {"import", "scene.reel", "cloud.ply", "--zxy-path", "path.txt"});
-  ASSERT_EQ(made.status, 0) << made.err;
-}
-
-std::set<std::string> filesIn(const fs::path& folder) {
-  std::set<std::string> names;
-  if (fs::is_directory(folder)) {
-    for (const auto& entry : fs::directory_iterator(folder)) {
-      names.insert(entry.path().filename().string());
-    }
-  }
-  return names;
-}
 
 int drawnPixels(const fs::path& file) {
   const auto image = gl::readTiff(file);
@@ -68,12 +42,12 @@ int drawnPixels(const fs::path& file) {
 
 TEST(CliRender, RendersTheWholeTimelineOfAnImportedDocumentAndResumes) {
   const TempDir dir;
-  makeDocument(dir);
-  const Outcome run = cloudreel(dir, {"render", "scene.reel", "--out", "frames", "--size",
-                                      "32x24", "--progress", "json"});
+  testing::makeSceneDocument(dir);
+  const Outcome run = cloudreel(
+      dir, {"render", "scene.reel", "--out", "frames", "--size", "32x24", "--progress", "json"});
   ASSERT_EQ(run.status, 0) << run.err;
   // One second at 25 frames a second: frames 0 to 25.
-  const auto written = filesIn(dir / "frames");
+  const auto written = testing::fileNamesIn(dir / "frames");
   ASSERT_EQ(written.size(), 26U);
   EXPECT_TRUE(written.contains("output_0000.tiff"));
   EXPECT_TRUE(written.contains("output_0025.tiff"));
@@ -108,35 +82,37 @@ TEST(CliRender, RendersTheWholeTimelineOfAnImportedDocumentAndResumes) {
 
 TEST(CliRender, RangesDepthStereoAndCameraPathsNameTheirFiles) {
   const TempDir dir;
-  makeDocument(dir);
-  Outcome run = cloudreel(dir, {"render", "scene.reel", "--out", "a", "--size", "32x24",
-                                "--frames", "3-4", "--depth", "--pattern", "f%03d.tif"});
+  testing::makeSceneDocument(dir);
+  Outcome run = cloudreel(dir, {"render", "scene.reel", "--out", "a", "--size", "32x24", "--frames",
+                                "3-4", "--depth", "--pattern", "f%03d.tif"});
   ASSERT_EQ(run.status, 0) << run.err;
-  EXPECT_EQ(filesIn(dir / "a"),
+  EXPECT_EQ(testing::fileNamesIn(dir / "a"),
             (std::set<std::string>{"f003.tif", "f004.tif", "depth_f003.tif", "depth_f004.tif"}));
   const auto depth = gl::readTiff(dir / "a/depth_f003.tif");
   ASSERT_TRUE(depth);
   EXPECT_EQ(depth->bitsPerSample, 16);
 
-  run = cloudreel(dir, {"render", "scene.reel", "--out", "b", "--size", "32x24", "--frames",
-                        "0-0", "--stereo", "0.2", "--depth"});
+  run = cloudreel(dir, {"render", "scene.reel", "--out", "b", "--size", "32x24", "--frames", "0-0",
+                        "--stereo", "0.2", "--depth"});
   ASSERT_EQ(run.status, 0) << run.err;
-  EXPECT_EQ(filesIn(dir / "b"), (std::set<std::string>{"L_output_0000.tiff", "R_output_0000.tiff"}));
+  EXPECT_EQ(testing::fileNamesIn(dir / "b"),
+            (std::set<std::string>{"L_output_0000.tiff", "R_output_0000.tiff"}));
 
   // The path's two frames by its name, then by its index.
   for (const char* path : {"path.txt", "0"}) {
     fs::remove_all(dir / "c");
-    run = cloudreel(dir, {"render", "scene.reel", "--out", "c", "--camera-path",
-                          path, "--size", "16x16"});
+    run = cloudreel(
+        dir, {"render", "scene.reel", "--out", "c", "--camera-path", path, "--size", "16x16"});
     ASSERT_EQ(run.status, 0) << run.err;
-    EXPECT_EQ(filesIn(dir / "c"), (std::set<std::string>{"output_0000.tiff", "output_0001.tiff"}));
+    EXPECT_EQ(testing::fileNamesIn(dir / "c"),
+              (std::set<std::string>{"output_0000.tiff", "output_0001.tiff"}));
     EXPECT_GT(drawnPixels(dir / "c/output_0001.tiff"), 0);
   }
 }
 
 TEST(CliRender, BadInputIsRefusedInOneLineBeforeAnyFrame) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   testing::writeFile(dir / "broken.reel", "not a document at all");
   testing::writeFile(dir / "a-file", "");
   const std::vector<std::pair<std::vector<std::string>, std::string>> cases = {
@@ -168,7 +144,7 @@ TEST(CliRender, BadInputIsRefusedInOneLineBeforeAnyFrame) {
 
 TEST(CliRender, FramesThatCannotBeWrittenAreNamedAndTheExitSaysSo) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   // The pattern names a folder that is not there.
   const Outcome run = cloudreel(dir, {"render", "scene.reel", "--out", "out", "--size", "16x16",
                                       "--frames", "1-2", "--pattern", "missing/%d.tiff"});
@@ -180,9 +156,9 @@ TEST(CliRender, FramesThatCannotBeWrittenAreNamedAndTheExitSaysSo) {
 
 TEST(CliRender, CtrlCFinishesTheFrameInFlightAndStops) {
   const TempDir dir;
-  makeDocument(dir);
+  testing::makeSceneDocument(dir);
   std::vector<std::string> args{CLOUDREEL_BINARY, "render", "scene.reel", "--out", "out",
-                                "--size", "1080p", "--progress", "plain"};
+                                "--size",         "1080p",  "--progress", "plain"};
   std::vector<char*> argv;
   for (std::string& arg : args) {
     argv.push_back(arg.data());
@@ -207,7 +183,7 @@ TEST(CliRender, CtrlCFinishesTheFrameInFlightAndStops) {
   ASSERT_TRUE(WIFEXITED(status));
   EXPECT_EQ(WEXITSTATUS(status), 130);
   // Every file there is a whole frame; the render did not run to its end.
-  const auto written = filesIn(dir / "out");
+  const auto written = testing::fileNamesIn(dir / "out");
   EXPECT_LT(written.size(), 26U);
   for (const std::string& name : written) {
     EXPECT_TRUE(gl::readTiff(dir / "out" / name)) << name;

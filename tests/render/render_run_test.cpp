@@ -2,6 +2,8 @@
 // main thread before each frame is drawn in the background, cancel taking
 // effect between frames, and the document's view updates off for the run
 // and on again at its end.
+#include "timeline/render_run.h"
+
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -10,6 +12,7 @@
 #include "camera/camera.h"
 #include "render/gl/image_file.h"
 #include "render/offline_gl_renderer.h"
+#include "render/render_properties_controller.h"
 #include "scene/my_document.h"
 #include "scene/point_layer.h"
 #include "support/memory_defaults.h"
@@ -17,10 +20,8 @@
 #include "support/temp_dir.h"
 #include "timeline/float_clips.h"
 #include "timeline/float_value_track.h"
-#include "timeline/render_run.h"
 #include "timeline/timeline.h"
 #include "timeline/timeline_window_controller.h"
-#include "render/render_properties_controller.h"
 
 namespace cloudreel {
 namespace {
@@ -133,13 +134,7 @@ class RenderRunTest : public testing::PixelTest {
     }
     return drawn;
   }
-  std::set<std::string> filesWritten() const {
-    std::set<std::string> names;
-    for (const auto& entry : fs::directory_iterator(dir.path())) {
-      names.insert(entry.path().filename().string());
-    }
-    return names;
-  }
+  std::set<std::string> filesWritten() const { return testing::fileNamesIn(dir.path()); }
 
   testing::MemoryDefaults defaults;
   testing::TempDir dir;
@@ -219,9 +214,9 @@ TEST_F(RenderRunTest, TheTimelineWindowRendersTheMarkedRangeWithTheSheetsSetting
   ASSERT_TRUE(run);
   ASSERT_TRUE(loop.runUntil([&] { return cancelled.has_value(); }, 60s));
   // truncate(10 × 0.2 - 1) + 1 = 2 to truncate(10 × 0.5) = 5.
-  EXPECT_EQ(filesWritten(), (std::set<std::string>{"f2.tif", "f3.tif", "f4.tif", "f5.tif",
-                                                    "depth_f2.tif", "depth_f3.tif",
-                                                    "depth_f4.tif", "depth_f5.tif"}));
+  EXPECT_EQ(filesWritten(),
+            (std::set<std::string>{"f2.tif", "f3.tif", "f4.tif", "f5.tif", "depth_f2.tif",
+                                   "depth_f3.tif", "depth_f4.tif", "depth_f5.tif"}));
   EXPECT_EQ(progress->label(), "frame 5 of 5");
   EXPECT_FLOAT_EQ(controller.cursor(), 0.5f);
   EXPECT_FLOAT_EQ(layer->pointSize(), 6.0f);

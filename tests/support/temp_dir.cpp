@@ -33,4 +33,14 @@ std::string readFile(const std::filesystem::path& path) {
   return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
 }
 
+std::set<std::string> fileNamesIn(const std::filesystem::path& folder) {
+  std::set<std::string> names;
+  std::error_code ec;
+  for (std::filesystem::directory_iterator it(folder, ec), end; !ec && it != end;
+       it.increment(ec)) {
+    names.insert(it->path().filename().string());
+  }
+  return names;
+}
+
 }  // namespace cloudreel::testing

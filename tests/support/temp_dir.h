@@ -4,6 +4,7 @@
 // the files tests put there.
 
 #include <filesystem>
+#include <set>
 #include <string>
 #include <string_view>
 
@@ -28,5 +29,7 @@ class TempDir {
 std::filesystem::path writeFile(const std::filesystem::path& path, std::string_view bytes);
 // The file's bytes; empty when it cannot be read.
 std::string readFile(const std::filesystem::path& path);
+// The names of what a folder holds; none for a folder that is not there.
+std::set<std::string> fileNamesIn(const std::filesystem::path& folder);
 
 }  // namespace cloudreel::testing
