@@ -27,6 +27,12 @@ namespace cloudreel {
 
 namespace {
 
+// Only a plain point layer re-saves its linked file; its subclasses (a
+// reconstruction's cloud) are read from files of their own.
+bool isPlainPointLayer(const Layer* layer) {
+  return layer != nullptr && typeid(*layer) == typeid(PointLayer);
+}
+
 std::string extensionWithoutDot(const std::filesystem::path& path) {
   std::string extension = path.extension().string();
   if (!extension.empty() && extension.front() == '.') {
@@ -486,7 +492,7 @@ void ApplicationCommands::endReRandomizeOptionsSheet(int returnCode, float expon
 void ApplicationCommands::menuReSaveLayer() {
   const auto document = theDocument();
   const auto layer = document ? document->selectedLayer() : nullptr;
-  if (layer && typeid(*layer) == typeid(PointLayer)) {
+  if (isPlainPointLayer(layer.get())) {
     static_cast<PointLayer&>(*layer).saveLinkedLayer();
   }
 }
@@ -555,7 +561,7 @@ bool ApplicationCommands::validateMenuItem(std::string_view action) const {
     return !index || *index != 0;
   }
   if (action == menu_action::kReSaveLayer) {
-    return selected && typeid(*selected) == typeid(PointLayer) &&
+    return isPlainPointLayer(selected.get()) &&
            static_cast<const PointLayer&>(*selected).fileStoredAsLink();
   }
   return true;
