@@ -1,5 +1,7 @@
 #include "platform/run_loop.h"
 
+#include <algorithm>
+
 namespace cloudreel {
 
 RunLoop& RunLoop::main() {
@@ -13,14 +15,37 @@ void RunLoop::post(Task task) {
     tasks_.push_back(std::move(task));
   }
   wake_.notify_all();
+  if (wakeHandler_) {
+    wakeHandler_();
+  }
 }
 
 RunLoop::TimerId RunLoop::scheduleTimer(Clock::duration interval, bool repeats, Task task) {
-  std::lock_guard lock(mutex_);
-  const TimerId id = nextTimer_++;
-  timers_.emplace(id, Timer{Clock::now() + interval, interval, repeats, std::move(task)});
+  TimerId id;
+  {
+    std::lock_guard lock(mutex_);
+    id = nextTimer_++;
+    timers_.emplace(id, Timer{Clock::now() + interval, interval, repeats, std::move(task)});
+  }
   wake_.notify_all();
+  if (wakeHandler_) {
+    wakeHandler_();
+  }
   return id;
+}
+
+void RunLoop::setWakeHandler(std::function<void()> handler) { wakeHandler_ = std::move(handler); }
+
+std::optional<RunLoop::Clock::duration> RunLoop::timeUntilNextTimer() const {
+  std::lock_guard lock(mutex_);
+  if (timers_.empty()) {
+    return std::nullopt;
+  }
+  auto due = Clock::time_point::max();
+  for (const auto& [id, timer] : timers_) {
+    due = std::min(due, timer.due);
+  }
+  return std::max(Clock::duration::zero(), due - Clock::now());
 }
 
 void RunLoop::invalidateTimer(TimerId id) {

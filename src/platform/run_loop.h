@@ -11,6 +11,7 @@
 #include <functional>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <thread>
 
 namespace cloudreel {
@@ -53,6 +54,15 @@ class RunLoop {
   // at its start, so a stop sent just before a run starts is never lost.
   void stop();
 
+  // For a front end that drives the loop from an event loop of its own:
+  // the handler is called, on the posting thread and outside the loop's
+  // lock, whenever a task is posted or a timer scheduled, so it can arrange
+  // a runPending on its own thread. Set it before other threads post.
+  void setWakeHandler(std::function<void()> handler);
+  // How long until the earliest timer is due (zero when one is late);
+  // nothing when no timer is scheduled.
+  std::optional<Clock::duration> timeUntilNextTimer() const;
+
  private:
   struct Timer {
     Clock::time_point due;
@@ -71,6 +81,7 @@ class RunLoop {
   std::map<TimerId, Timer> timers_;
   TimerId nextTimer_ = 1;
   bool stopRequested_ = false;
+  std::function<void()> wakeHandler_;
 };
 
 // A serial background thread: work runs in the order given, one item at a

@@ -23,9 +23,14 @@ void UndoManager::registerUndoWithTarget(const void* target, Action action) {
   if (disabled_ > 0) {
     return;
   }
-  if (!undoing_ && !redoing_) {
+  const bool newChange = !undoing_ && !redoing_;
+  const bool beginsStep = newChange && !openGroupHasActions();
+  if (newChange) {
     // A new change makes the redo history meaningless.
     redoStack_.clear();
+  }
+  if (beginsStep) {
+    tell(Change::Done);
   }
   if (open_.empty()) {
     if (groupsByEvent_) {
@@ -125,6 +130,7 @@ void UndoManager::undo() {
   Group group = std::move(undoStack_.back());
   undoStack_.pop_back();
   runGroup(std::move(group), true);
+  tell(Change::Undone);
 }
 
 void UndoManager::redo() {
@@ -135,6 +141,13 @@ void UndoManager::redo() {
   Group group = std::move(redoStack_.back());
   redoStack_.pop_back();
   runGroup(std::move(group), false);
+  tell(Change::Redone);
+}
+
+void UndoManager::tell(Change change) const {
+  if (changeHandler_) {
+    changeHandler_(change);
+  }
 }
 
 std::string UndoManager::undoActionName() const {
@@ -159,6 +172,7 @@ void UndoManager::removeAllActions() {
   redoStack_.clear();
   open_.clear();
   eventGroupOpen_ = false;
+  tell(Change::Cleared);
 }
 
 void UndoManager::removeAllActionsWithTarget(const void* target) {

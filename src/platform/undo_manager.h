@@ -63,6 +63,13 @@ class UndoManager {
   // Forgets every action registered for the target, e.g. when it goes away.
   void removeAllActionsWithTarget(const void* target);
 
+  // What changed the history, for a document's edited mark: a new step was
+  // begun (told at its first registration, so the mark shows while the
+  // event still runs), a step was undone or redone, or everything was
+  // forgotten.
+  enum class Change { Done, Undone, Redone, Cleared };
+  void setChangeHandler(std::function<void(Change)> handler) { changeHandler_ = std::move(handler); }
+
  private:
   struct Entry {
     const void* target;
@@ -77,6 +84,7 @@ class UndoManager {
   void closeGroupOnto(Group group);
   std::vector<Group>& stackReceivingSteps();
   void runGroup(Group group, bool asUndo);
+  void tell(Change change) const;
 
   RunLoop* eventLoop_;
   std::vector<Group> undoStack_;
@@ -93,6 +101,7 @@ class UndoManager {
   bool undoing_ = false;
   bool redoing_ = false;
   int disabled_ = 0;
+  std::function<void(Change)> changeHandler_;
 };
 
 }  // namespace cloudreel

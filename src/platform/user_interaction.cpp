@@ -41,6 +41,11 @@ std::optional<std::string> LoggingUserInteraction::runOpenPanel(const OpenPanel&
   return std::nullopt;
 }
 
+std::optional<std::string> LoggingUserInteraction::runSavePanel(const SavePanel& panel) {
+  logf("%s: nowhere to save can be chosen here; cancelled", panel.title);
+  return std::nullopt;
+}
+
 void LoggingUserInteraction::beep() { logf("beep"); }
 
 }  // namespace cloudreel

@@ -29,6 +29,15 @@ struct OpenPanel {
   std::vector<std::string> allowedFileTypes;
 };
 
+struct SavePanel {
+  std::string title;
+  // The name the panel proposes.
+  std::string nameFieldValue;
+  // The extension (without the dot) a chosen name is given when it has
+  // none; empty for any.
+  std::string requiredFileType;
+};
+
 class UserInteraction {
  public:
   virtual ~UserInteraction() = default;
@@ -39,6 +48,8 @@ class UserInteraction {
   virtual int runAlert(const Alert& alert) = 0;
   // Answers the chosen path, or nothing when the user cancels.
   virtual std::optional<std::string> runOpenPanel(const OpenPanel& panel) = 0;
+  // Answers the path to save to, or nothing when the user cancels.
+  virtual std::optional<std::string> runSavePanel(const SavePanel& panel) = 0;
   // The system beep: a command that cannot be carried out as things stand
   // (a cut without both marks) says so without a dialog.
   virtual void beep() = 0;
@@ -53,13 +64,14 @@ class UserInteraction {
 };
 
 // The built-in front end for headless use: writes errors and alerts to the
-// log, answers alerts with their default button and cancels open panels; a
-// beep is a debug line.
+// log, answers alerts with their default button and cancels open and save
+// panels; a beep is a debug line.
 class LoggingUserInteraction final : public UserInteraction {
  public:
   void presentError(const Error& error) override;
   int runAlert(const Alert& alert) override;
   std::optional<std::string> runOpenPanel(const OpenPanel& panel) override;
+  std::optional<std::string> runSavePanel(const SavePanel& panel) override;
   void beep() override;
 };
 

@@ -45,6 +45,27 @@ TEST(RunLoop, RepeatingTimerFiresUntilInvalidatedFromItsOwnTask) {
   EXPECT_FALSE(loop.isTimerValid(single));
 }
 
+// A front end's own event loop is woken by posts from any thread and by
+// new timers, and learns when the next timer is due.
+TEST(RunLoop, WakesAFrontEndOnPostsAndTimersAndTellsWhenTheNextTimerIsDue) {
+  RunLoop loop;
+  std::atomic<int> wakes = 0;
+  loop.setWakeHandler([&] { ++wakes; });
+  EXPECT_FALSE(loop.timeUntilNextTimer().has_value());
+  std::thread poster([&] { loop.post([] {}); });
+  poster.join();
+  EXPECT_EQ(wakes, 1);
+  const auto far = loop.scheduleTimer(1h, false, [] {});
+  EXPECT_EQ(wakes, 2);
+  ASSERT_TRUE(loop.timeUntilNextTimer().has_value());
+  EXPECT_GT(*loop.timeUntilNextTimer(), 59min);
+  const auto overdue = loop.scheduleTimer(-1s, false, [] {});
+  EXPECT_EQ(loop.timeUntilNextTimer(), RunLoop::Clock::duration::zero());
+  EXPECT_TRUE(loop.runPending());
+  EXPECT_FALSE(loop.isTimerValid(overdue));
+  EXPECT_TRUE(loop.isTimerValid(far));
+}
+
 // A lost stop leaves the run to its deadline, which answers NO: the checks
 // fail on the outcome, not on how long the run took.
 TEST(RunLoop, StopEndsARunWhetherItArrivesBeforeOrDuringTheRun) {

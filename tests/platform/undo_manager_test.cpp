@@ -130,5 +130,25 @@ TEST(UndoManager, APostedCloseOutlivingItsManagerIsHarmless) {
   EXPECT_TRUE(loop.runPending());
 }
 
+// A step is reported once, at its first registration; its redo (built
+// while undoing) and registrations while disabled are not new steps.
+TEST(UndoManager, ReportsEachNewStepUndoRedoAndClearOnce) {
+  UndoManager undo;
+  std::vector<UndoManager::Change> changes;
+  undo.setChangeHandler([&](UndoManager::Change c) { changes.push_back(c); });
+  UndoableValue a{undo};
+  a.set(1, "One");
+  a.set(2, "One");  // same event group
+  undo.closeEventGroup();
+  undo.disableUndoRegistration();
+  a.set(3, "Off");
+  undo.enableUndoRegistration();
+  undo.undo();
+  undo.redo();
+  undo.removeAllActions();
+  using C = UndoManager::Change;
+  EXPECT_EQ(changes, (std::vector<C>{C::Done, C::Undone, C::Redone, C::Cleared}));
+}
+
 }  // namespace
 }  // namespace cloudreel

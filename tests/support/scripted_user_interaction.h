@@ -23,6 +23,11 @@ class ScriptedUserInteraction : public UserInteraction {
     panelAnswers_.push_back(std::move(path));
   }
 
+  // The next save panel chooses this path, or cancels for nullopt.
+  void answerSavePanelWith(std::optional<std::string> path) {
+    savePanelAnswers_.push_back(std::move(path));
+  }
+
   void presentError(const Error& error) override { errors.push_back(error); }
   int runAlert(const Alert& alert) override {
     alerts.push_back(alert);
@@ -42,16 +47,27 @@ class ScriptedUserInteraction : public UserInteraction {
     panelAnswers_.pop_front();
     return answer;
   }
+  std::optional<std::string> runSavePanel(const SavePanel& panel) override {
+    savePanels.push_back(panel);
+    if (savePanelAnswers_.empty()) {
+      return std::nullopt;
+    }
+    auto answer = std::move(savePanelAnswers_.front());
+    savePanelAnswers_.pop_front();
+    return answer;
+  }
   void beep() override { ++beeps; }
 
   std::vector<Error> errors;
   std::vector<Alert> alerts;
   std::vector<OpenPanel> panels;
+  std::vector<SavePanel> savePanels;
   int beeps = 0;
 
  private:
   std::deque<int> alertAnswers_;
   std::deque<std::optional<std::string>> panelAnswers_;
+  std::deque<std::optional<std::string>> savePanelAnswers_;
 };
 
 }  // namespace cloudreel::testing
