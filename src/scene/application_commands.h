@@ -177,6 +177,11 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
   // point-file import's then follows importOptionsViewForFile.
   ImportOptionsView openPanelOptionsView() const { return openPanelOptionsView_; }
 
+  // Reads a file into the front document as the import commands do once
+  // their panel has answered (the application's own launch arguments come
+  // here too).
+  void runImport(ImportRequest request);
+
   // Reading a file off the main thread: with a queue set, reads run on it
   // and the layer is added by a task on `completionLoop`, to the document
   // that was in front when the command ran (nothing when it has gone).
@@ -225,7 +230,6 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
 
  private:
   void handleActivation(const Notification& notification);
-  void runImport(ImportRequest request);
   void finishImport(const std::weak_ptr<MyDocument>& target, ImportResult result);
   std::optional<std::filesystem::path> chooseFile(ImportOptionsView view);
   void addNewLayer(std::shared_ptr<Layer> layer, std::shared_ptr<CameraPath> cameraPath);

@@ -160,6 +160,15 @@ bool DocumentSession::canClose() {
   return false;
 }
 
+std::string menuItemTitleForStep(std::string_view verb, std::string_view actionName) {
+  std::string title(verb);
+  if (!actionName.empty()) {
+    title += ' ';
+    title += actionName;
+  }
+  return title;
+}
+
 // --- RecentDocuments
 
 std::vector<std::filesystem::path> RecentDocuments::urls() const {

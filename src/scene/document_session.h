@@ -10,6 +10,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/error.h"
@@ -82,6 +83,10 @@ class DocumentSession {
   bool savedStateLost_ = false;
   std::function<void()> editedHandler_;
 };
+
+// The title of an Undo or Redo menu item: the verb and the step's name
+// ("Undo New Layer"), or the verb alone for a step without one.
+std::string menuItemTitleForStep(std::string_view verb, std::string_view actionName);
 
 // The Open Recent list, newest first, kept in the user defaults so that it
 // outlives the application.
