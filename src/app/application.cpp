@@ -99,19 +99,16 @@ DocumentWindow* Application::newDocument() {
 
 DocumentWindow* Application::openFile(const std::filesystem::path& path) {
   const std::filesystem::path absolute = std::filesystem::absolute(path).lexically_normal();
-  if (pointFileKindForPath(absolute) != PointFileKind::Unknown) {
+  std::optional<ImportRequest> request = importRequestForFile(
+      absolute, ImportOptions::fromDefaults(UserDefaults::standardUserDefaults()));
+  if (request) {
     // A point file or reconstruction becomes the first layer of a new
-    // document, read in the background like any import.
+    // document, read in the background like any import, its cameras kept
+    // as the reconstruction import keeps them.
+    request->storeCameras = request->kind == ImportRequest::Kind::Bundler;
     DocumentWindow* window = newDocument();
-    const PointFileKind kind = pointFileKindForPath(absolute);
-    ImportRequest request;
-    request.url = absolute;
-    request.kind = kind == PointFileKind::Ply       ? ImportRequest::Kind::Ply
-                   : kind == PointFileKind::Bundler ? ImportRequest::Kind::Bundler
-                                                    : ImportRequest::Kind::PointFile;
-    request.storeCameras = kind == PointFileKind::Bundler;
     commands_.documentWindowDidActivate(window);
-    commands_.runImport(std::move(request));
+    commands_.runImport(std::move(*request));
     return window;
   }
   for (DocumentWindow* window : windows_) {

@@ -131,14 +131,11 @@ void buildFileMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
 void buildEditMenu(QMenuBar* bar, DocumentWindow& window) {
   QMenu* edit = bar->addMenu(QStringLiteral("&Edit"));
   UndoManager& undo = window.document()->undoManager();
-  QAction* undoItem = addItem(edit, QStringLiteral("Undo"), [&undo, &window] {
-    undo.undo();
-    window.refreshPanels();
-  }, QKeySequence::Undo);
-  QAction* redoItem = addItem(edit, QStringLiteral("Redo"), [&undo, &window] {
-    undo.redo();
-    window.refreshPanels();
-  }, QKeySequence::Redo);
+  // The document reports what an undo or redo changed; the panels follow.
+  QAction* undoItem = addItem(edit, QStringLiteral("Undo"), [&undo] { undo.undo(); },
+                              QKeySequence::Undo);
+  QAction* redoItem = addItem(edit, QStringLiteral("Redo"), [&undo] { undo.redo(); },
+                              QKeySequence::Redo);
   markValidated({undoItem, redoItem});
   QObject::connect(edit, &QMenu::aboutToShow, edit, [undoItem, redoItem, &undo] {
     undoItem->setText(QString::fromStdString(menuItemTitleForStep("Undo", undo.undoActionName())));

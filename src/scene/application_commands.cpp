@@ -280,17 +280,10 @@ std::optional<std::filesystem::path> ApplicationCommands::chooseFile(ImportOptio
   return std::filesystem::path(*chosen);
 }
 
-void ApplicationCommands::importPointFile() {
-  if (!theDocument()) {
-    return;
-  }
-  const auto url = chooseFile(ImportOptionsView::None);
-  if (!url) {
-    return;
-  }
-  const ImportOptions options = ImportOptions::fromDefaults(UserDefaults::standardUserDefaults());
-  ImportRequest request{ImportRequest::Kind::PointFile, *url, false, 1};
-  switch (pointFileKindForPath(*url)) {
+std::optional<ImportRequest> importRequestForFile(const std::filesystem::path& url,
+                                                  const ImportOptions& options) {
+  ImportRequest request{ImportRequest::Kind::PointFile, url, false, 1};
+  switch (pointFileKindForPath(url)) {
     case PointFileKind::PointFile:
       request.shouldLink = options.openRWBFileAsReference;
       break;
@@ -303,12 +296,28 @@ void ApplicationCommands::importPointFile() {
       request.downsample = options.openPLYDownsample ? options.openPLYDownsampleFactor : 1;
       break;
     case PointFileKind::Unknown:
-      UserInteraction::shared().runAlert(Alert{std::string(kUnknownFileFormatMessage),
-                                               std::string(kUnknownFileFormatInformative),
-                                               {"OK"}});
-      return;
+      return std::nullopt;
   }
-  runImport(std::move(request));
+  return request;
+}
+
+void ApplicationCommands::importPointFile() {
+  if (!theDocument()) {
+    return;
+  }
+  const auto url = chooseFile(ImportOptionsView::None);
+  if (!url) {
+    return;
+  }
+  std::optional<ImportRequest> request = importRequestForFile(
+      *url, ImportOptions::fromDefaults(UserDefaults::standardUserDefaults()));
+  if (!request) {
+    UserInteraction::shared().runAlert(Alert{std::string(kUnknownFileFormatMessage),
+                                             std::string(kUnknownFileFormatInformative),
+                                             {"OK"}});
+    return;
+  }
+  runImport(std::move(*request));
 }
 
 void ApplicationCommands::importRWB() {

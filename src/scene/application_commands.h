@@ -82,6 +82,11 @@ struct ImportRequest {
   bool storeCameras = false;
 };
 
+// The request the point-file import makes for a file, by its extension and
+// the import options; nothing for an extension it does not know.
+std::optional<ImportRequest> importRequestForFile(const std::filesystem::path& url,
+                                                  const ImportOptions& options);
+
 // What reading gave: the layer (null on failure), the camera path that also
 // joins the document's stored paths (a camera path file's, or a bundle
 // file's cameras when asked for), and the error to present (empty when
