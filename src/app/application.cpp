@@ -5,14 +5,17 @@
 #include <QDialog>
 #include <QDialogButtonBox>
 #include <QDoubleSpinBox>
+#include <QFileDialog>
 #include <QFormLayout>
 #include <QImage>
+#include <QProgressDialog>
 #include <QSpinBox>
 #include <QTimer>
 #include <algorithm>
 
 #include "app/document_window.h"
 #include "app/gl_view_widget.h"
+#include "app/import_options_panel.h"
 #include "app/preferences_window.h"
 #include "app/qt_gl_context.h"
 #include "platform/log.h"
@@ -27,14 +30,12 @@ Application::Application(Options options)
       bridge_(RunLoop::main()),
       shareGroup_(std::make_shared<gl::ShareGroup>()) {
   commands_.setBackgroundReading(&importQueue_, &RunLoop::main());
-  commands_.setImportFinishedHandler([](const ImportResult& result) {
-    if (!result.error.message.empty()) {
-      UserInteraction::shared().presentError(result.error);
-    }
-  });
+  commands_.setImportsChangedHandler([this] { importsChanged(); });
 }
 
 Application::~Application() {
+  commands_.setImportsChangedHandler(nullptr);
+  delete importProgress_;
   for (DocumentWindow* window : std::vector<DocumentWindow*>(windows_)) {
     window->setAttribute(Qt::WA_DeleteOnClose, false);
     delete window;
@@ -48,7 +49,8 @@ bool Application::launch() {
     DocumentWindow* window = openFile(path);
     first = first != nullptr ? first : window;
   }
-  if (options_.files.empty() && (options_.screenshot || commands_.applicationShouldOpenUntitledFile())) {
+  if (options_.files.empty() &&
+      (options_.screenshot || commands_.applicationShouldOpenUntitledFile())) {
     first = newDocument();
   }
   if (options_.screenshot) {
@@ -245,6 +247,45 @@ void Application::runReRandomizeSheet() {
   layout->addRow(buttons);
   const int code = sheet.exec() == QDialog::Accepted ? 0 : 1;
   commands_.endReRandomizeOptionsSheet(code, static_cast<float>(exponent->value()));
+}
+
+void Application::customizeOpenPanel(QFileDialog& dialog) {
+  if (!commands_.importPanelRunning()) {
+    return;
+  }
+  auto* options = new ImportOptionsPanel(
+      [this](const std::filesystem::path& selected) {
+        return commands_.openPanelOptionsView(selected);
+      },
+      &dialog);
+  options->attachTo(dialog);
+}
+
+QProgressDialog* Application::importProgress() const { return importProgress_; }
+
+void Application::importsChanged() {
+  const auto& files = commands_.filesBeingRead();
+  if (files.empty()) {
+    delete importProgress_;
+    return;
+  }
+  if (!importProgress_) {
+    // Not modal: the windows stay usable while the files are read, and the
+    // layers appear as each read finishes. Reading cannot be interrupted,
+    // so there is nothing to cancel.
+    importProgress_ = new QProgressDialog(mainWindow_);
+    importProgress_->setWindowTitle(QStringLiteral("Importing"));
+    importProgress_->setCancelButton(nullptr);
+    importProgress_->setRange(0, 0);
+    importProgress_->setMinimumDuration(500);
+    importProgress_->setAutoClose(false);
+    importProgress_->setAutoReset(false);
+  }
+  const QString first = QString::fromStdString(files.front().filename().string());
+  importProgress_->setLabelText(
+      files.size() == 1
+          ? QStringLiteral("Reading %1…").arg(first)
+          : QStringLiteral("Reading %1 and %2 more…").arg(first).arg(files.size() - 1));
 }
 
 void Application::takeScreenshot(DocumentWindow& window) {

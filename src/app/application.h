@@ -6,6 +6,7 @@
 // makes and closes the Qt windows around them.
 
 #include <QObject>
+#include <QPointer>
 #include <filesystem>
 #include <memory>
 #include <optional>
@@ -16,6 +17,9 @@
 #include "platform/run_loop.h"
 #include "scene/application_commands.h"
 #include "scene/document_session.h"
+
+class QFileDialog;
+class QProgressDialog;
 
 namespace cloudreel::gl {
 class ShareGroup;
@@ -77,6 +81,12 @@ class Application : public QObject {
   // The sheets some commands ask for (see ApplicationCommands).
   void runPLYOptionsSheet();
   void runReRandomizeSheet();
+  // Gives the import commands' open panels their options (the other panels
+  // stay as they are); QtUserInteraction calls it for every open panel.
+  void customizeOpenPanel(QFileDialog& dialog);
+  // The dialog that says which files are being read, while any are (it
+  // shows itself once reading has taken half a second); null otherwise.
+  QProgressDialog* importProgress() const;
 
  signals:
   void recentDocumentsChanged();
@@ -85,6 +95,7 @@ class Application : public QObject {
   DocumentWindow* makeWindow(std::shared_ptr<DocumentSession> session);
   void giveContext(DocumentSession& session);
   void takeScreenshot(DocumentWindow& window);
+  void importsChanged();
   int nextUntitledNumber();
 
   Options options_;
@@ -95,6 +106,7 @@ class Application : public QObject {
   std::vector<DocumentWindow*> windows_;
   DocumentWindow* mainWindow_ = nullptr;
   std::unique_ptr<PreferencesWindow> preferences_;
+  QPointer<QProgressDialog> importProgress_;
   int untitledCount_ = 0;
   int exitStatus_ = 0;
   bool terminating_ = false;

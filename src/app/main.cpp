@@ -6,6 +6,7 @@
 
 #include <CLI/CLI.hpp>
 #include <QApplication>
+#include <QFileDialog>
 #include <cstdio>
 
 #include "app/application.h"
@@ -40,8 +41,9 @@ int main(int argc, char** argv) {
   std::string screenshot;
   std::string windowSize;
   bool verbose = false;
-  cli.add_option("files", files, "documents (.reel) to open; point files (.rwb, .ply) and "
-                                 "reconstructions (.out) are imported into a new document");
+  cli.add_option("files", files,
+                 "documents (.reel) to open; point files (.rwb, .ply) and "
+                 "reconstructions (.out) are imported into a new document");
   cli.add_option("--screenshot", screenshot,
                  "draw the first window once, save it to this PNG file and quit");
   cli.add_option("--window-size", windowSize, "the windows' size as WxH (default 1024x768)");
@@ -67,17 +69,24 @@ int main(int argc, char** argv) {
   // A screenshot run asks nobody anything: errors go to standard error and
   // questions take their default answer.
   const bool unattended = !screenshot.empty();
-  const auto previousUser = cloudreel::UserInteraction::setShared(
-      unattended ? nullptr : std::make_shared<cloudreel::app::QtUserInteraction>());
+  const auto dialogs = unattended ? nullptr : std::make_shared<cloudreel::app::QtUserInteraction>();
+  const auto previousUser = cloudreel::UserInteraction::setShared(dialogs);
 
   int status = 0;
   {
     cloudreel::app::Application application(std::move(options));
+    if (dialogs) {
+      dialogs->setOpenPanelHook(
+          [&application](QFileDialog& dialog) { application.customizeOpenPanel(dialog); });
+    }
     if (!application.launch()) {
       status = application.exitStatus();
     } else {
       status = QApplication::exec();
     }
+  }
+  if (dialogs) {
+    dialogs->setOpenPanelHook(nullptr);
   }
   cloudreel::UserInteraction::setShared(previousUser);
   return status;

@@ -90,6 +90,9 @@ std::optional<std::string> QtUserInteraction::runOpenPanel(const OpenPanel& pane
                          ? QFileDialog::Directory
                          : QFileDialog::ExistingFile);
   dialog.setNameFilters(nameFilters(panel.allowedFileTypes));
+  if (openPanelHook_) {
+    openPanelHook_(dialog);
+  }
   if (dialog.exec() != QDialog::Accepted || dialog.selectedFiles().isEmpty()) {
     return std::nullopt;
   }

@@ -4,10 +4,12 @@
 
 #include <QObject>
 #include <QTimer>
+#include <functional>
 
 #include "platform/run_loop.h"
 #include "platform/user_interaction.h"
 
+class QFileDialog;
 class QWidget;
 
 namespace cloudreel::app {
@@ -32,11 +34,20 @@ class RunLoopBridge : public QObject {
 // Dialogs parented to the active window (none when there is none).
 class QtUserInteraction final : public UserInteraction {
  public:
+  // Called with every open panel before it runs, to add controls of its own
+  // (the import commands' options).
+  void setOpenPanelHook(std::function<void(QFileDialog&)> hook) {
+    openPanelHook_ = std::move(hook);
+  }
+
   void presentError(const Error& error) override;
   int runAlert(const Alert& alert) override;
   std::optional<std::string> runOpenPanel(const OpenPanel& panel) override;
   std::optional<std::string> runSavePanel(const SavePanel& panel) override;
   void beep() override;
+
+ private:
+  std::function<void(QFileDialog&)> openPanelHook_;
 };
 
 }  // namespace cloudreel::app

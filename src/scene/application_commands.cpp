@@ -269,15 +269,28 @@ void ApplicationCommands::setCurrentLayerVisible(bool visible) {
 
 // --- imports
 
-std::optional<std::filesystem::path> ApplicationCommands::chooseFile(ImportOptionsView view) {
+std::optional<std::filesystem::path> ApplicationCommands::chooseFile(ImportOptionsView view,
+                                                                     bool followsSelection) {
   openPanelOptionsView_ = view;
+  openPanelFollowsSelection_ = followsSelection;
+  importPanelRunning_ = true;
   const std::optional<std::string> chosen =
       UserInteraction::shared().runOpenPanel(OpenPanel{"Import", true, false, {}});
+  importPanelRunning_ = false;
+  openPanelFollowsSelection_ = false;
   openPanelOptionsView_ = ImportOptionsView::None;
   if (!chosen) {
     return std::nullopt;
   }
   return std::filesystem::path(*chosen);
+}
+
+ImportOptionsView ApplicationCommands::openPanelOptionsView(
+    const std::filesystem::path& selected) const {
+  if (openPanelFollowsSelection_) {
+    return importOptionsViewForFile(selected);
+  }
+  return openPanelOptionsView_;
 }
 
 std::optional<ImportRequest> importRequestForFile(const std::filesystem::path& url,
@@ -305,12 +318,12 @@ void ApplicationCommands::importPointFile() {
   if (!theDocument()) {
     return;
   }
-  const auto url = chooseFile(ImportOptionsView::None);
+  const auto url = chooseFile(ImportOptionsView::None, true);
   if (!url) {
     return;
   }
-  std::optional<ImportRequest> request = importRequestForFile(
-      *url, ImportOptions::fromDefaults(UserDefaults::standardUserDefaults()));
+  std::optional<ImportRequest> request =
+      importRequestForFile(*url, ImportOptions::fromDefaults(UserDefaults::standardUserDefaults()));
   if (!request) {
     UserInteraction::shared().runAlert(Alert{std::string(kUnknownFileFormatMessage),
                                              std::string(kUnknownFileFormatInformative),
@@ -390,20 +403,32 @@ void ApplicationCommands::runImport(ImportRequest request) {
     finishImport(target, readImport(request));
     return;
   }
-  ++importsInProgress_;
+  filesBeingRead_.push_back(request.url);
+  const std::filesystem::path url = request.url;
   auto result = std::make_shared<ImportResult>();
   // The completion runs on the loop these commands live on; the token
   // tells it whether they still do.
   std::weak_ptr<const void> alive = lifetimeToken();
-  queue_->async([result, request = std::move(request)] { *result = readImport(request); },
-                *completionLoop_,
-                [this, alive, target = std::move(target), result] {
-                  if (alive.expired()) {
-                    return;
-                  }
-                  --importsInProgress_;
-                  finishImport(target, std::move(*result));
-                });
+  queue_->async(
+      [result, request = std::move(request)] { *result = readImport(request); }, *completionLoop_,
+      [this, alive, target = std::move(target), result, url] {
+        if (alive.expired()) {
+          return;
+        }
+        finishImport(target, std::move(*result));
+        // The first entry for the file: reads of one file are
+        // interchangeable to whoever lists them.
+        if (const auto it = std::find(filesBeingRead_.begin(), filesBeingRead_.end(), url);
+            it != filesBeingRead_.end()) {
+          filesBeingRead_.erase(it);
+        }
+        if (importsChanged_) {
+          importsChanged_();
+        }
+      });
+  if (importsChanged_) {
+    importsChanged_();
+  }
 }
 
 void ApplicationCommands::finishImport(const std::weak_ptr<MyDocument>& target,
@@ -416,9 +441,6 @@ void ApplicationCommands::finishImport(const std::weak_ptr<MyDocument>& target,
     if (result.cameraPath) {
       document->addCameraPath(result.cameraPath);
     }
-  }
-  if (importFinished_) {
-    importFinished_(result);
   }
 }
 

@@ -178,9 +178,13 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
   void importCameraPath();
   void importMatrixPath();
   void importBundler();
-  // The options view the open panel running now shows when it opens; the
-  // point-file import's then follows importOptionsViewForFile.
-  ImportOptionsView openPanelOptionsView() const { return openPanelOptionsView_; }
+  // Whether one of the import commands' open panels is running now.
+  bool importPanelRunning() const { return importPanelRunning_; }
+  // The options view that panel shows while `selected` is the file selected
+  // in it (empty when none is): the point-file import's follows
+  // importOptionsViewForFile, every other import's is fixed. None while no
+  // import panel runs.
+  ImportOptionsView openPanelOptionsView(const std::filesystem::path& selected = {}) const;
 
   // Reads a file into the front document as the import commands do once
   // their panel has answered (the application's own launch arguments come
@@ -193,11 +197,15 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
   // Without one (the default) reading happens inside the command. Neither
   // is owned; both must outlive the commands' use of them.
   void setBackgroundReading(BackgroundQueue* queue, RunLoop* completionLoop);
-  // Reads started and not yet finished on the completion loop.
-  int importsInProgress() const { return importsInProgress_; }
-  // Called on the completion loop when an import ends, added or not.
-  void setImportFinishedHandler(std::function<void(const ImportResult&)> handler) {
-    importFinished_ = std::move(handler);
+  // Reads started and not yet finished on the completion loop, and their
+  // files in the order they started.
+  int importsInProgress() const { return static_cast<int>(filesBeingRead_.size()); }
+  const std::vector<std::filesystem::path>& filesBeingRead() const { return filesBeingRead_; }
+  // Called on the command's thread when a background read starts and on the
+  // completion loop when one ends (after its layer was added, or its error
+  // presented): what a progress display follows.
+  void setImportsChangedHandler(std::function<void()> handler) {
+    importsChanged_ = std::move(handler);
   }
 
   // --- add commands: a new object through addLayer
@@ -236,7 +244,9 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
  private:
   void handleActivation(const Notification& notification);
   void finishImport(const std::weak_ptr<MyDocument>& target, ImportResult result);
-  std::optional<std::filesystem::path> chooseFile(ImportOptionsView view);
+  // `followsSelection`: the panel's options view follows the selected file.
+  std::optional<std::filesystem::path> chooseFile(ImportOptionsView view,
+                                                  bool followsSelection = false);
   void addNewLayer(std::shared_ptr<Layer> layer, std::shared_ptr<CameraPath> cameraPath);
   // The selected layer's index in the document's top-level layers.
   std::optional<std::size_t> selectedIndex() const;
@@ -249,10 +259,12 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
   std::optional<std::filesystem::path> pendingPLY_;
   std::weak_ptr<PointLayer> reRandomizeTarget_;
   ImportOptionsView openPanelOptionsView_ = ImportOptionsView::None;
+  bool importPanelRunning_ = false;
+  bool openPanelFollowsSelection_ = false;
   BackgroundQueue* queue_ = nullptr;
   RunLoop* completionLoop_ = nullptr;
-  int importsInProgress_ = 0;
-  std::function<void(const ImportResult&)> importFinished_;
+  std::vector<std::filesystem::path> filesBeingRead_;
+  std::function<void()> importsChanged_;
   bool observing_ = false;
 };
 

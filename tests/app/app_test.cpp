@@ -5,14 +5,23 @@
 #include <gtest/gtest.h>
 
 #include <QApplication>
+#include <QCheckBox>
+#include <QDialogButtonBox>
+#include <QFileDialog>
+#include <QListView>
 #include <QMenu>
 #include <QMenuBar>
+#include <QProgressDialog>
+#include <QPushButton>
+#include <QSpinBox>
 #include <QTest>
+#include <QTimer>
 #include <QTreeView>
 
 #include "app/application.h"
 #include "app/document_window.h"
 #include "app/gl_view_widget.h"
+#include "app/import_options_panel.h"
 #include "app/qt_gl_context.h"
 #include "camera/scene_camera.h"
 #include "geometry/affine_transform.h"
@@ -21,6 +30,7 @@
 #include "scene/core_classes.h"
 #include "scene/layer.h"
 #include "scene/my_document.h"
+#include "scene/point_layer.h"
 #include "support/cli_runner.h"
 #include "support/memory_defaults.h"
 #include "support/ply_text.h"
@@ -110,8 +120,8 @@ class AppTest : public ::testing::Test {
 
   // Waits until the background imports have been added.
   void waitForImports() {
-    EXPECT_TRUE(QTest::qWaitFor([&] { return application->commands().importsInProgress() == 0; },
-                                10000));
+    EXPECT_TRUE(
+        QTest::qWaitFor([&] { return application->commands().importsInProgress() == 0; }, 10000));
   }
 
   testing::MemoryDefaults defaults;
@@ -128,8 +138,8 @@ TEST(AppScreenshot, ThePictureOfAnImportedCloudShowsItsPointsWhereTheyBelong) {
   TempDir dir;
   writeRedSquare(dir / "square.ply");
   const auto run = testing::runProgram(
-      dir.path(), {CLOUDREEL_APP_BINARY, "--screenshot", "shot.png", "--window-size", "640x480",
-                   "square.ply"});
+      dir.path(),
+      {CLOUDREEL_APP_BINARY, "--screenshot", "shot.png", "--window-size", "640x480", "square.ply"});
   ASSERT_EQ(run.status, 0) << run.err;
   QImage image;
   ASSERT_TRUE(image.load(QString::fromStdString((dir / "shot.png").string())));
@@ -201,6 +211,84 @@ TEST_F(AppTest, KeysAndDragsMoveTheCamerasAndThePixels) {
   EXPECT_EQ(view.grabFramebuffer(), orthographic);
   QTest::keyClick(&view, '~');
   EXPECT_EQ(pointView.viewMode(), PointsDocumentGLView::kNormal);
+}
+
+// Clicks the file of that name in an open panel's list, once the panel has
+// read its folder.
+bool clickFile(QFileDialog& dialog, const QString& name) {
+  auto* list = dialog.findChild<QListView*>(QStringLiteral("listView"));
+  if (list == nullptr) {
+    return false;
+  }
+  QModelIndex found;
+  const bool listed = QTest::qWaitFor([&] {
+    const QAbstractItemModel* model = list->model();
+    for (int row = 0; row < model->rowCount(list->rootIndex()); ++row) {
+      const QModelIndex index = model->index(row, 0, list->rootIndex());
+      if (index.data().toString() == name) {
+        found = index;
+        return true;
+      }
+    }
+    return false;
+  });
+  if (!listed) {
+    return false;
+  }
+  QTest::mouseClick(list->viewport(), Qt::LeftButton, {}, list->visualRect(found).center());
+  return true;
+}
+
+TEST_F(AppTest, TheImportPanelOffersTheSelectedFilesOptionsAndReadingShowsProgress) {
+  writeRedSquare(dir / "square.ply");
+  testing::writeFile(dir / "notes.txt", "not points");
+  start();
+  // Real dialogs for this one: the panel is Qt's own file dialog.
+  auto dialogs = std::make_shared<QtUserInteraction>();
+  dialogs->setOpenPanelHook([&](QFileDialog& dialog) { application->customizeOpenPanel(dialog); });
+  UserInteraction::setShared(dialogs);
+
+  std::vector<ImportOptionsView> shown;
+  QTimer::singleShot(0, [&] {
+    auto* dialog = qobject_cast<QFileDialog*>(QApplication::activeModalWidget());
+    ASSERT_NE(dialog, nullptr);
+    auto cancel = qScopeGuard([&] { dialog->reject(); });
+    auto* options = dialog->findChild<ImportOptionsPanel*>();
+    ASSERT_NE(options, nullptr);
+    dialog->setDirectory(QString::fromStdString(dir.path().string()));
+    shown.push_back(options->shownView());
+    ASSERT_TRUE(clickFile(*dialog, QStringLiteral("notes.txt")));
+    shown.push_back(options->shownView());
+    ASSERT_TRUE(clickFile(*dialog, QStringLiteral("square.ply")));
+    shown.push_back(options->shownView());
+    // Keep one vertex in four: the choice goes to the defaults the import
+    // reads once the panel closes.
+    QCheckBox* downsample = nullptr;
+    for (QCheckBox* box : options->findChildren<QCheckBox*>()) {
+      downsample = box->text().startsWith(QStringLiteral("Keep one")) ? box : downsample;
+    }
+    ASSERT_TRUE(downsample != nullptr && downsample->isVisible());
+    QTest::mouseClick(downsample, Qt::LeftButton);
+    options->findChild<QSpinBox*>()->setValue(4);
+    auto* buttons = dialog->findChild<QDialogButtonBox*>();
+    ASSERT_TRUE(buttons != nullptr && buttons->button(QDialogButtonBox::Open) != nullptr);
+    cancel.dismiss();
+    buttons->button(QDialogButtonBox::Open)->click();
+  });
+  application->commands().importPointFile();
+  using V = ImportOptionsView;
+  EXPECT_EQ(shown, (std::vector<V>{V::None, V::None, V::Ply}));
+
+  // The file is read in the background; the progress dialog names it until
+  // the layer is in.
+  QProgressDialog* progress = application->importProgress();
+  ASSERT_NE(progress, nullptr);
+  EXPECT_TRUE(progress->labelText().contains(QStringLiteral("square.ply")));
+  waitForImports();
+  EXPECT_EQ(application->importProgress(), nullptr);
+  const auto& layers = application->mainWindow()->document()->layers();
+  ASSERT_EQ(layers.size(), 1u);
+  EXPECT_EQ(std::static_pointer_cast<PointLayer>(layers[0])->nPoints(), 40 * 40 / 4);
 }
 
 TEST_F(AppTest, MenusEnableTheirItemsAsTheDocumentStands) {

@@ -36,15 +36,18 @@ class FakeWindow : public DocumentWindowController {
   int zoomIns = 0, zoomOuts = 0;
 };
 
-// A user who also notes which options view each open panel showed.
+// A user who also notes which options view each import command's open
+// panel showed, with nothing selected and then with a PLY file selected.
 class PanelWatchingUser : public testing::ScriptedUserInteraction {
  public:
   std::optional<std::string> runOpenPanel(const OpenPanel& panel) override {
-    views.push_back(commands->openPanelOptionsView());
+    if (commands->importPanelRunning()) {
+      views.emplace_back(commands->openPanelOptionsView(), commands->openPanelOptionsView("s.ply"));
+    }
     return ScriptedUserInteraction::runOpenPanel(panel);
   }
   const ApplicationCommands* commands = nullptr;
-  std::vector<ImportOptionsView> views;
+  std::vector<std::pair<ImportOptionsView, ImportOptionsView>> views;
 };
 
 class ApplicationCommandsTest : public ::testing::Test {
@@ -215,10 +218,17 @@ TEST_F(ApplicationCommandsTest, EachImportCommandUsesItsOwnOptionsAndViews) {
   ASSERT_EQ(doc().storedCameraPaths().size(), 3u);
   EXPECT_EQ(std::static_pointer_cast<Layer>(doc().storedCameraPaths()[2]), lastLayer());
 
-  const std::vector<ImportOptionsView> shown = {ImportOptionsView::Bundler, ImportOptionsView::None,
-                                                ImportOptionsView::None, ImportOptionsView::None};
+  import(&ApplicationCommands::importPointFile, pointFile("again.rwb"));
+
+  using V = ImportOptionsView;
+  const std::vector<std::pair<V, V>> shown = {{V::Bundler, V::Bundler},
+                                              {V::None, V::None},
+                                              {V::None, V::None},
+                                              {V::None, V::None},
+                                              {V::None, V::Ply}};
   EXPECT_EQ(user->views, shown);
-  EXPECT_EQ(commands.openPanelOptionsView(), ImportOptionsView::None);
+  EXPECT_FALSE(commands.importPanelRunning());
+  EXPECT_EQ(commands.openPanelOptionsView("s.ply"), ImportOptionsView::None);
 }
 
 TEST_F(ApplicationCommandsTest, PLYImportWaitsForItsSheetAndTakesItsDownsampling) {
@@ -470,15 +480,17 @@ TEST_F(ApplicationCommandsTest, ReadingOffTheMainThreadAddsOnTheCompletionLoop) 
   RunLoop loop;
   BackgroundQueue queue;
   commands.setBackgroundReading(&queue, &loop);
-  int finished = 0;
-  commands.setImportFinishedHandler([&](const ImportResult&) { ++finished; });
+  std::vector<int> counts;  // the reads in progress at each change
+  commands.setImportsChangedHandler([&] { counts.push_back(commands.importsInProgress()); });
 
   import(&ApplicationCommands::importRWB, pointFile("big.rwb", 1000));
   import(&ApplicationCommands::importRWB, dir / "missing.rwb");
-  EXPECT_EQ(commands.importsInProgress(), 2);
+  EXPECT_EQ(counts, (std::vector<int>{1, 2}));
+  const std::vector<std::filesystem::path> reading = {dir / "big.rwb", dir / "missing.rwb"};
+  EXPECT_EQ(commands.filesBeingRead(), reading);
   EXPECT_TRUE(doc().layers().empty());  // nothing until the loop runs
-  ASSERT_TRUE(loop.runUntil([&] { return finished == 2; }, std::chrono::seconds(20)));
-  EXPECT_EQ(commands.importsInProgress(), 0);
+  ASSERT_TRUE(loop.runUntil([&] { return counts.size() == 4; }, std::chrono::seconds(20)));
+  EXPECT_EQ(counts, (std::vector<int>{1, 2, 1, 0}));
   ASSERT_EQ(doc().layers().size(), 1u);
   EXPECT_EQ(std::static_pointer_cast<PointLayer>(lastLayer())->nPoints(), 1000);
   ASSERT_EQ(user->errors.size(), 1u);
@@ -487,7 +499,8 @@ TEST_F(ApplicationCommandsTest, ReadingOffTheMainThreadAddsOnTheCompletionLoop) 
   import(&ApplicationCommands::importBundler, bundleFile());
   window.doc.reset();
   commands.documentWindowDidDeactivate();
-  ASSERT_TRUE(loop.runUntil([&] { return finished == 3; }, std::chrono::seconds(20)));
+  ASSERT_TRUE(loop.runUntil([&] { return counts.size() == 6; }, std::chrono::seconds(20)));
+  EXPECT_TRUE(commands.filesBeingRead().empty());
 }
 
 TEST_F(ApplicationCommandsTest, PreferencesEditTheColoursAndFolders) {
@@ -525,6 +538,7 @@ TEST_F(ApplicationCommandsTest, PreferencesEditTheColoursAndFolders) {
   preferences.changeImagePath();
   user->answerOpenPanelWith(std::nullopt);
   preferences.changePointProxyPath();
+  EXPECT_TRUE(user->views.empty());  // folder choosers show no import options
   EXPECT_EQ(userDefaults.stringForKey(kImageSavePathKey), (dir / "images").string());
   EXPECT_EQ(userDefaults.stringForKey(kPointCachePathKey), homeDirectory().string() + "/rw_points");
   ASSERT_EQ(user->panels.size(), 2u);
