@@ -18,16 +18,14 @@
 #include <QTimer>
 #include <QTreeView>
 
+#include "app/app_fixture.h"
 #include "app/application.h"
 #include "app/document_window.h"
 #include "app/gl_view_widget.h"
 #include "app/import_options_panel.h"
-#include "app/qt_gl_context.h"
 #include "camera/scene_camera.h"
 #include "geometry/affine_transform.h"
-#include "platform/class_registry.h"
 #include "platform/user_defaults.h"
-#include "scene/core_classes.h"
 #include "scene/layer.h"
 #include "scene/my_document.h"
 #include "scene/point_layer.h"
@@ -40,99 +38,7 @@
 namespace cloudreel::app {
 namespace {
 
-using testing::TempDir;
-
-// A square of bright red points at x 2..3, right of where the default scene
-// camera (15 units along +z, looking at the origin) looks.
-void writeRedSquare(const std::filesystem::path& path) {
-  testing::PlyElement vertex{"vertex", testing::kPlyXyzRgb, {}};
-  for (int i = 0; i < 40; ++i) {
-    for (int j = 0; j < 40; ++j) {
-      vertex.instances.push_back({2.0 + i / 40.0, -0.5 + j / 40.0, 0.0, 255.0, 0.0, 0.0});
-    }
-  }
-  testing::writeFile(path, testing::plyText({vertex}, "binary_little_endian"));
-}
-
-bool isRed(QRgb pixel) { return qRed(pixel) > 150 && qGreen(pixel) < 80 && qBlue(pixel) < 80; }
-
-// Red pixels in the left 45% of the picture and in its right 30% (the red
-// x axis drawn from the middle ends between the two).
-std::pair<int, int> redPixelsLeftAndRight(const QImage& image) {
-  int left = 0, right = 0;
-  for (int y = 0; y < image.height(); ++y) {
-    for (int x = 0; x < image.width(); ++x) {
-      if (isRed(image.pixel(x, y))) {
-        left += x < image.width() * 45 / 100 ? 1 : 0;
-        right += x > image.width() * 70 / 100 ? 1 : 0;
-      }
-    }
-  }
-  return {left, right};
-}
-
-QAction* menuItem(QMainWindow& window, const QString& menuTitle, const QString& itemTitle,
-                  QMenu** menuOut = nullptr) {
-  for (QAction* top : window.menuBar()->actions()) {
-    if (top->menu() != nullptr && top->text().remove('&') == menuTitle) {
-      if (menuOut != nullptr) {
-        *menuOut = top->menu();
-      }
-      for (QAction* action : top->menu()->actions()) {
-        if (action->text() == itemTitle) {
-          return action;
-        }
-      }
-    }
-  }
-  return nullptr;
-}
-
-// Where a camera stands and which way it looks.
-std::array<double, 6> pose(const Camera& camera) {
-  const AffineTransform& m = *camera.objectToWorld();
-  const auto z = m.basisVectorZ();
-  return {m.translationX(), m.translationY(), m.translationZ(), z->x(), z->y(), z->z()};
-}
-
-// A menu as it is when the user opens it.
-void openMenu(QMenu* menu) { emit menu->aboutToShow(); }
-
-class AppTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    previousUser_ = UserInteraction::setShared(user);
-    UserDefaults::standardUserDefaults().setObjectForKey(false, "KTEmptyDoc");
-  }
-  void TearDown() override {
-    application.reset();
-    UserInteraction::setShared(previousUser_);
-  }
-
-  DocumentWindow& start(std::vector<std::filesystem::path> files = {}) {
-    application = std::make_unique<Application>(Application::Options{files, {}, 640, 480});
-    EXPECT_TRUE(application->launch());
-    DocumentWindow* window = files.empty() ? application->newDocument() : application->mainWindow();
-    EXPECT_NE(window, nullptr);
-    EXPECT_TRUE(QTest::qWaitForWindowExposed(window));
-    return *window;
-  }
-
-  // Waits until the background imports have been added.
-  void waitForImports() {
-    EXPECT_TRUE(
-        QTest::qWaitFor([&] { return application->commands().importsInProgress() == 0; }, 10000));
-  }
-
-  testing::MemoryDefaults defaults;
-  TempDir dir;
-  std::shared_ptr<testing::ScriptedUserInteraction> user =
-      std::make_shared<testing::ScriptedUserInteraction>();
-  std::unique_ptr<Application> application;
-
- private:
-  std::shared_ptr<UserInteraction> previousUser_;
-};
+using namespace test;
 
 TEST(AppScreenshot, ThePictureOfAnImportedCloudShowsItsPointsWhereTheyBelong) {
   TempDir dir;
@@ -151,18 +57,6 @@ TEST(AppScreenshot, ThePictureOfAnImportedCloudShowsItsPointsWhereTheyBelong) {
       dir.path(), {CLOUDREEL_APP_BINARY, "--screenshot", "none.png", "missing.reel"});
   EXPECT_NE(bad.status, 0);
   EXPECT_FALSE(std::filesystem::exists(dir / "none.png"));
-}
-
-// A drag from one point to another with the given button held.
-void drag(QWidget& widget, Qt::MouseButton button, QPoint from, QPoint to) {
-  QTest::mousePress(&widget, button, {}, from);
-  for (int step = 1; step <= 10; ++step) {
-    const QPointF at = from + (to - from) * step / 10.0;
-    QMouseEvent move(QEvent::MouseMove, at, widget.mapToGlobal(at), Qt::NoButton, button,
-                     Qt::NoModifier);
-    QApplication::sendEvent(&widget, &move);
-  }
-  QTest::mouseRelease(&widget, button, {}, to);
 }
 
 TEST_F(AppTest, KeysAndDragsMoveTheCamerasAndThePixels) {
@@ -211,32 +105,6 @@ TEST_F(AppTest, KeysAndDragsMoveTheCamerasAndThePixels) {
   EXPECT_EQ(view.grabFramebuffer(), orthographic);
   QTest::keyClick(&view, '~');
   EXPECT_EQ(pointView.viewMode(), PointsDocumentGLView::kNormal);
-}
-
-// Clicks the file of that name in an open panel's list, once the panel has
-// read its folder.
-bool clickFile(QFileDialog& dialog, const QString& name) {
-  auto* list = dialog.findChild<QListView*>(QStringLiteral("listView"));
-  if (list == nullptr) {
-    return false;
-  }
-  QModelIndex found;
-  const bool listed = QTest::qWaitFor([&] {
-    const QAbstractItemModel* model = list->model();
-    for (int row = 0; row < model->rowCount(list->rootIndex()); ++row) {
-      const QModelIndex index = model->index(row, 0, list->rootIndex());
-      if (index.data().toString() == name) {
-        found = index;
-        return true;
-      }
-    }
-    return false;
-  });
-  if (!listed) {
-    return false;
-  }
-  QTest::mouseClick(list->viewport(), Qt::LeftButton, {}, list->visualRect(found).center());
-  return true;
 }
 
 TEST_F(AppTest, TheImportPanelOffersTheSelectedFilesOptionsAndReadingShowsProgress) {
@@ -370,12 +238,3 @@ TEST_F(AppTest, ADocumentEditedSavedAndOpenedAgainKeepsItsLayersAndName) {
 
 }  // namespace
 }  // namespace cloudreel::app
-
-int main(int argc, char** argv) {
-  QCoreApplication::setAttribute(Qt::AA_ShareOpenGLContexts);
-  cloudreel::app::setDefaultSurfaceFormat();
-  QApplication application(argc, argv);
-  cloudreel::registerCoreClasses(cloudreel::ClassRegistry::shared());
-  ::testing::InitGoogleTest(&argc, argv);
-  return RUN_ALL_TESTS();
-}
