@@ -186,6 +186,11 @@ void Application::windowWillClose(DocumentWindow& window) {
     mainWindow_ = nullptr;
   }
   std::erase(windows_, &window);
+  // The last window of a document closes the document: the panels let go.
+  if (std::none_of(windows_.begin(), windows_.end(),
+                   [&](auto* other) { return other->session() == window.session(); })) {
+    window.document()->close();
+  }
   if (windows_.empty() && !terminating_ &&
       commands_.applicationShouldTerminateAfterLastWindowClosed()) {
     QTimer::singleShot(0, qApp, &QApplication::quit);

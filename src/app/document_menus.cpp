@@ -272,6 +272,16 @@ void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& applicat
   validateOnShow(layer, application);
 }
 
+// The floating panels, one each for the whole application, showing the
+// front document.
+void buildWindowMenu(QMenuBar* bar, DocumentWindow& window, Application& application) {
+  QMenu* windows = bar->addMenu(QStringLiteral("&Window"));
+  addItem(windows, QStringLiteral("Minimize"), [&window] { window.showMinimized(); },
+          QKeySequence(QStringLiteral("Ctrl+M")));
+  windows->addSeparator();
+  (void)application;
+}
+
 }  // namespace
 
 void buildDocumentMenus(DocumentWindow& window, Application& application) {
@@ -280,6 +290,7 @@ void buildDocumentMenus(DocumentWindow& window, Application& application) {
   buildEditMenu(bar, window);
   buildViewMenu(bar, window, application);
   buildLayerMenu(bar, window, application);
+  buildWindowMenu(bar, window, application);
   // A menu disables what cannot be done while it is open; once closed its
   // items are enabled again, so that their shortcuts reach the commands,
   // which refuse what they cannot do.
