@@ -58,6 +58,14 @@ void Timeline::addTrack(std::shared_ptr<TimelineTrack> track) {
   }
 }
 
+void Timeline::insertTrackAtIndex(std::shared_ptr<TimelineTrack> track, int index) {
+  if (!track) {
+    return;
+  }
+  const auto at = std::clamp<std::ptrdiff_t>(index, 0, static_cast<std::ptrdiff_t>(tracks_.size()));
+  tracks_.insert(tracks_.begin() + at, std::move(track));
+}
+
 void Timeline::removeTrack(const TimelineTrack& track) {
   removeObjectFromTracksAtIndex(indexOfTrack(track));
 }

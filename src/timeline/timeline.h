@@ -50,7 +50,11 @@ class Timeline : public Object {
   // Plain list edits. Removing a track that is not there, or an index
   // outside the list, changes nothing.
   void addTrack(std::shared_ptr<TimelineTrack> track);
+  // An index past the end appends; a negative one inserts first.
+  void insertTrackAtIndex(std::shared_ptr<TimelineTrack> track, int index);
   void removeTrack(const TimelineTrack& track);
+  // The track's place in the list; -1 when it is not there.
+  int indexOfTrack(const TimelineTrack& track) const;
   void removeObjectFromTracksAtIndex(int index);
 
   // Every track, in list order, applies its value for t. Animation is not an
@@ -116,8 +120,6 @@ class Timeline : public Object {
   void initWithCoder(KeyedUnarchiver& coder) override;
 
  private:
-  int indexOfTrack(const TimelineTrack& track) const;
-
   TrackList tracks_;
   float startTimeInSeconds_ = 0.0f;
   std::int32_t fps_ = 25;
