@@ -87,6 +87,7 @@ const PropertyTable& SourceCamera::properties() const {
 void SourceCamera::setImagePath(const std::filesystem::path& path) {
   texture_.reset();
   photographFile_.clear();
+  photographPath_ = path;
   decodeFailed_ = false;
   imageWidth_ = 0;
   imageHeight_ = 0;
@@ -123,7 +124,7 @@ void SourceCamera::uploadOpenGLTexture() {
     // Logged once: from now on the camera has no photograph to decode.
     const char* reason = stbi_failure_reason();
     logWarningf("cannot decode photograph %s: %s", photographFile_.string(),
-         reason != nullptr ? reason : "unknown reason");
+                reason != nullptr ? reason : "unknown reason");
     decodeFailed_ = true;
     imageWidth_ = 0;
     imageHeight_ = 0;
@@ -232,6 +233,7 @@ void SourceCamera::copyInto(Animatable3DObject& target) const {
   camera.imageWidth_ = imageWidth_;
   camera.imageHeight_ = imageHeight_;
   camera.photographFile_ = photographFile_;
+  camera.photographPath_ = photographPath_;
   camera.decodeFailed_ = decodeFailed_;
   if (hasImage_) {
     camera.setAspect(aspect());

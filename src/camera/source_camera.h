@@ -49,6 +49,10 @@ class SourceCamera : public Camera {
   void setImagePath(const std::filesystem::path& path);
   // Always empty (see setImagePath); archived as it is.
   const std::string& imagePath() const { return imagePath_; }
+  // The file last named for the photograph, kept even when it could not be
+  // read, so that the photograph window can say which file is missing;
+  // empty when none was named. Not archived, like the photograph.
+  const std::filesystem::path& photographPath() const { return photographPath_; }
   bool hasImage() const { return hasImage_; }
   void setHasImage(bool v) { changeValueForKey("hasImage", hasImage_, v); }
   int imageWidth() const { return imageWidth_; }
@@ -104,6 +108,7 @@ class SourceCamera : public Camera {
   int imageHeight_ = 0;
   // Where the photograph is decoded from when the texture is made.
   std::filesystem::path photographFile_;
+  std::filesystem::path photographPath_;
   bool decodeFailed_ = false;
   gl::GLName texture_;
 };

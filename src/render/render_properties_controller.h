@@ -6,10 +6,13 @@
 // renders with the same defaults.
 
 #include <array>
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 
+#include "platform/error.h"
 #include "render/frame_pattern.h"
 
 namespace cloudreel {
@@ -79,6 +82,13 @@ class RenderPropertiesController {
   // window loads.
   void windowDidLoad();
 
+  // Makes sure the frames can go where the settings say before a render
+  // starts: the output folder is created when missing (the default one
+  // usually is, on a new account). False, with an error naming the folder,
+  // when no folder is given, a file stands in its place or it cannot be
+  // made; also for a size without pixels.
+  [[nodiscard]] bool prepareForRender(Error* error = nullptr) const;
+
  private:
   int width_;
   int height_;
@@ -94,9 +104,14 @@ class RenderPropertiesController {
 };
 
 // The progress of a render as its sheet shows it: a bar from 0 to 100, a
-// label, and whether the user pressed cancel.
+// label, and whether the user pressed cancel. A sheet showing it sets a
+// change handler to hear of every new bar value and label, so it never polls.
 class RenderProgressController {
  public:
+  // Called after every change of the bar, the label or the cancel flag;
+  // null for none.
+  void setChangeHandler(std::function<void()> handler) { changed_ = std::move(handler); }
+
   // The bar at fraction × 100, the label "%0.0f%%" of it.
   void setProgress(float fraction);
   // The bar at frame / lastFrame × 100, the label "frame %d of %d". A last
@@ -107,9 +122,12 @@ class RenderProgressController {
   double barValue() const { return barValue_; }
   const std::string& label() const { return label_; }
   bool hasCancelled() const { return hasCancelled_; }
-  void cancelButtonClicked() { hasCancelled_ = true; }
+  void cancelButtonClicked();
 
  private:
+  void changed() const;
+
+  std::function<void()> changed_;
   double barValue_ = 0.0;
   std::string label_;
   bool hasCancelled_ = false;

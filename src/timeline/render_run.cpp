@@ -1,6 +1,7 @@
 #include "timeline/render_run.h"
 
 #include "render/offline_gl_renderer.h"
+#include "render/render_properties_controller.h"
 #include "scene/my_document.h"
 #include "timeline/timeline.h"
 
@@ -14,6 +15,27 @@ RenderFrameRange markedRange(const Timeline& timeline) {
   const auto fps = static_cast<float>(timeline.fps());
   return {saturatingCast<int>(fps * timeline.inPoint() - 1.0f),
           saturatingCast<int>(fps * timeline.outPoint())};
+}
+
+std::optional<RenderFrameRange> renderRangeForSelection(const Timeline& timeline, int rangeTag,
+                                                        Error* error) {
+  if (rangeTag == static_cast<int>(RenderRange::WholeTimeline)) {
+    return wholeTimelineRange(timeline);
+  }
+  const auto refuse = [error](std::string message) -> std::optional<RenderFrameRange> {
+    setError(error, "Render", 1, std::move(message));
+    return std::nullopt;
+  };
+  // An unset mark is -1; one that is not a number fails the test as well.
+  if (!(timeline.inPoint() >= 0.0f) || !(timeline.outPoint() >= 0.0f)) {
+    return refuse(
+        "The marked range cannot be rendered: set both the in and the out mark, or render the "
+        "whole timeline.");
+  }
+  if (timeline.outPoint() < timeline.inPoint()) {
+    return refuse("The marked range cannot be rendered: the out mark lies before the in mark.");
+  }
+  return markedRange(timeline);
 }
 
 float timeForRenderFrame(const Timeline& timeline, int frame) {

@@ -14,6 +14,7 @@
 
 #include <functional>
 #include <memory>
+#include <optional>
 
 #include "platform/error.h"
 #include "platform/run_loop.h"
@@ -43,6 +44,12 @@ RenderFrameRange wholeTimelineRange(const Timeline& timeline);
 // starts at frame 1. Marks that are not set (-1) give a range starting at
 // frame -25 or so; callers check the marks first.
 RenderFrameRange markedRange(const Timeline& timeline);
+// The range the settings sheet's selector chooses (tag 1 the whole
+// timeline, any other tag the marks), checked before a render starts: the
+// marked range needs both marks set and the out point not before the in
+// point. Otherwise nothing, with an error the user can act on.
+std::optional<RenderFrameRange> renderRangeForSelection(const Timeline& timeline, int rangeTag,
+                                                        Error* error = nullptr);
 // The time of frame n: n / totalLengthInFrames × totalLengthInSeconds, in
 // single precision. A timeline of no frames would divide by zero; every
 // frame of it is at time 0.

@@ -9,6 +9,8 @@
 #include <cmath>
 #include <filesystem>
 #include <set>
+#include <string>
+#include <vector>
 
 #include "camera/camera.h"
 #include "camera/zxy_camera_path.h"
@@ -273,7 +275,35 @@ TEST(RenderSheets, PresetsRangesAndProgress) {
   EXPECT_EQ(resolutionPresetNamed("PAL SQUARE PIXEL"), 3);
   EXPECT_FALSE(resolutionPresetNamed("720"));
 
+  // The output folder is made when missing; a file in its place, no folder
+  // or no pixels are refused with a message saying so.
+  const testing::TempDir dir;
+  sheet.setOutputPath((dir / "frames" / "today").string());
+  Error error;
+  EXPECT_TRUE(sheet.prepareForRender(&error)) << error.message;
+  EXPECT_TRUE(fs::is_directory(dir / "frames" / "today"));
+  EXPECT_TRUE(sheet.prepareForRender());
+  testing::writeFile(dir / "taken", "x");
+  struct Refusal {
+    std::string folder;
+    int width;
+    const char* says;
+  };
+  for (const Refusal& r :
+       {Refusal{(dir / "taken").string(), 720, "not a folder"},
+        Refusal{(dir / "taken" / "sub").string(), 720, "cannot be made"},
+        Refusal{"", 720, "Choose a folder"}, Refusal{dir.path().string(), 0, "no pixels"}}) {
+    sheet.setOutputPath(r.folder);
+    sheet.setWidth(r.width);
+    EXPECT_FALSE(sheet.prepareForRender(&error)) << r.folder;
+    EXPECT_NE(error.message.find(r.says), std::string::npos) << error.message;
+  }
+
   RenderProgressController progress;
+  // The sheet hears of each change as it happens, with the new values in place.
+  std::vector<std::string> heard;
+  progress.setChangeHandler(
+      [&] { heard.push_back(progress.label() + (progress.hasCancelled() ? " cancelled" : "")); });
   progress.setProgressFrameLastFrame(3, 12);
   EXPECT_EQ(progress.label(), "frame 3 of 12");
   EXPECT_DOUBLE_EQ(progress.barValue(), 25.0);
@@ -284,6 +314,11 @@ TEST(RenderSheets, PresetsRangesAndProgress) {
   EXPECT_FALSE(progress.hasCancelled());
   progress.cancelButtonClicked();
   EXPECT_TRUE(progress.hasCancelled());
+  EXPECT_EQ(heard,
+            (std::vector<std::string>{"frame 3 of 12", "frame 0 of 0", "42%", "42% cancelled"}));
+  progress.setChangeHandler(nullptr);
+  progress.setProgress(0.5f);
+  EXPECT_EQ(heard.size(), 4u);
 }
 
 }  // namespace

@@ -52,6 +52,34 @@ TEST(RenderRange, FramesAndTimesKeepTheirOffByOneRules) {
   EXPECT_EQ((RenderFrameRange{4, 2}).frameCount(), 0);
 }
 
+TEST(RenderRange, TheMarkedRangeIsRefusedUntilBothMarksAreSetInOrder) {
+  Timeline timeline;
+  timeline.setFps(10);
+  // The whole timeline needs no marks.
+  ASSERT_TRUE(renderRangeForSelection(timeline, 1));
+  EXPECT_EQ(renderRangeForSelection(timeline, 1)->last, 10);
+  struct Case {
+    float in, out;
+    bool accepted;
+    const char* says;
+  };
+  for (const Case& c : {Case{-1.0f, -1.0f, false, "set both"}, Case{0.2f, -1.0f, false, "set both"},
+                        Case{-1.0f, 0.5f, false, "set both"}, Case{0.5f, 0.2f, false, "before"},
+                        Case{0.2f, 0.5f, true, ""}, Case{0.3f, 0.3f, true, ""}}) {
+    timeline.setInPoint(c.in);
+    timeline.setOutPoint(c.out);
+    Error error;
+    const auto range = renderRangeForSelection(timeline, 2, &error);
+    EXPECT_EQ(range.has_value(), c.accepted) << c.in << " " << c.out;
+    if (range) {
+      EXPECT_EQ(range->firstFrame(), markedRange(timeline).firstFrame());
+      EXPECT_EQ(range->last, markedRange(timeline).last);
+    } else {
+      EXPECT_NE(error.message.find(c.says), std::string::npos) << error.message;
+    }
+  }
+}
+
 TEST(RenderRun, WithoutARendererTheRunStillWalksItsRangeAndRestoresViewUpdates) {
   const testing::MemoryDefaults defaults;
   MyDocument document;
