@@ -9,18 +9,27 @@
 #include <QFormLayout>
 #include <QImage>
 #include <QProgressDialog>
+#include <QScopeGuard>
 #include <QSpinBox>
 #include <QTimer>
 #include <algorithm>
 
+#include "app/cameras_panel.h"
+#include "app/colour_grading_panel.h"
 #include "app/document_window.h"
 #include "app/gl_view_widget.h"
 #include "app/import_options_panel.h"
+#include "app/paths_panel.h"
+#include "app/photograph_window.h"
 #include "app/preferences_window.h"
+#include "app/property_panel.h"
 #include "app/qt_gl_context.h"
+#include "app/timeline_window.h"
+#include "app/view_controls_panel.h"
 #include "platform/log.h"
 #include "platform/notification_center.h"
 #include "platform/user_defaults.h"
+#include "render/camera_path_render.h"
 #include "scene/my_document.h"
 
 namespace cloudreel::app {
@@ -35,6 +44,12 @@ Application::Application(Options options)
 
 Application::~Application() {
   commands_.setImportsChangedHandler(nullptr);
+  // The panels go before the windows whose documents and views they show.
+  timeline_.reset();
+  camerasPanel_.reset();
+  pathsPanel_.reset();
+  viewControls_.reset();
+  photographWindow_.reset();
   delete importProgress_;
   for (DocumentWindow* window : std::vector<DocumentWindow*>(windows_)) {
     window->setAttribute(Qt::WA_DeleteOnClose, false);
@@ -216,6 +231,43 @@ void Application::showPreferences() {
   preferences_->raise();
 }
 
+namespace {
+
+template <typename Panel, typename... Args>
+void showPanel(std::unique_ptr<Panel>& panel, Args&&... args) {
+  if (!panel) {
+    panel = std::make_unique<Panel>(std::forward<Args>(args)...);
+  }
+  panel->show();
+  panel->raise();
+}
+
+}  // namespace
+
+void Application::showTimeline() { showPanel(timeline_, *this); }
+
+void Application::showCamerasPanel() {
+  showPanel(camerasPanel_, mainWindow_ != nullptr ? mainWindow_->document() : nullptr);
+}
+
+void Application::showPathsPanel() {
+  showPanel(pathsPanel_, mainWindow_ != nullptr ? mainWindow_->document() : nullptr);
+}
+
+void Application::showViewControls() { showPanel(viewControls_, *this); }
+
+void Application::showPhotographWindow() {
+  showPanel(photographWindow_, mainWindow_ != nullptr ? mainWindow_->document() : nullptr);
+}
+
+void Application::showPropertyPanel() {
+  showPanel(propertyPanel_, mainWindow_ != nullptr ? mainWindow_->document() : nullptr);
+}
+
+void Application::showColourGradingPanel() {
+  showPanel(colourGradingPanel_, mainWindow_ != nullptr ? mainWindow_->document() : nullptr);
+}
+
 void Application::runPLYOptionsSheet() {
   QDialog sheet(QApplication::activeWindow());
   sheet.setWindowTitle(QStringLiteral("PLY Options"));
@@ -252,6 +304,22 @@ void Application::runReRandomizeSheet() {
   layout->addRow(buttons);
   const int code = sheet.exec() == QDialog::Accepted ? 0 : 1;
   commands_.endReRandomizeOptionsSheet(code, static_cast<float>(exponent->value()));
+}
+
+void Application::renderCameraPath(DocumentWindow& window) {
+  std::optional<CameraPathRenderResult> result;
+  {
+    // The frames are drawn on this thread, without progress: the cursor
+    // says the application is busy until they are written.
+    QApplication::setOverrideCursor(Qt::WaitCursor);
+    const auto restore = qScopeGuard([] { QApplication::restoreOverrideCursor(); });
+    result = renderSelectedCameraPath(*window.document(), window.glView().pointView().glScene());
+  }
+  if (!result) {
+    UserInteraction::shared().beep();
+    return;
+  }
+  UserInteraction::shared().runAlert(cameraPathRenderAlert(*result));
 }
 
 void Application::customizeOpenPanel(QFileDialog& dialog) {

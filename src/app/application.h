@@ -27,8 +27,15 @@ class ShareGroup;
 
 namespace cloudreel::app {
 
+class CamerasPanel;
+class ColourGradingPanel;
 class DocumentWindow;
+class PathsPanel;
+class PhotographWindow;
 class PreferencesWindow;
+class PropertyPanel;
+class TimelineWindow;
+class ViewControlsPanel;
 
 class Application : public QObject {
   Q_OBJECT
@@ -78,9 +85,30 @@ class Application : public QObject {
   // Asks for every edited document; quits unless the user cancels.
   void terminate();
   void showPreferences();
+  // The floating panels, one each for the application, made when first
+  // shown; each follows the front document (null until shown).
+  void showTimeline();
+  void showCamerasPanel();
+  void showPathsPanel();
+  void showViewControls();
+  void showPhotographWindow();
+  void showPropertyPanel();
+  void showColourGradingPanel();
+  TimelineWindow* timelineWindow() const { return timeline_.get(); }
+  CamerasPanel* camerasPanel() const { return camerasPanel_.get(); }
+  PathsPanel* pathsPanel() const { return pathsPanel_.get(); }
+  ViewControlsPanel* viewControls() const { return viewControls_.get(); }
+  PhotographWindow* photographWindow() const { return photographWindow_.get(); }
+  PropertyPanel* propertyPanel() const { return propertyPanel_.get(); }
+  ColourGradingPanel* colourGradingPanel() const { return colourGradingPanel_.get(); }
   // The sheets some commands ask for (see ApplicationCommands).
   void runPLYOptionsSheet();
   void runReRandomizeSheet();
+  // Renders the window's selected camera path into the image folder of the
+  // defaults (the Layer menu and the view controls offer it), with a wait
+  // cursor meanwhile, then tells the user how many frames went where. A
+  // selection that is no camera path beeps.
+  void renderCameraPath(DocumentWindow& window);
   // Gives the import commands' open panels their options (the other panels
   // stay as they are); QtUserInteraction calls it for every open panel.
   void customizeOpenPanel(QFileDialog& dialog);
@@ -106,6 +134,13 @@ class Application : public QObject {
   std::vector<DocumentWindow*> windows_;
   DocumentWindow* mainWindow_ = nullptr;
   std::unique_ptr<PreferencesWindow> preferences_;
+  std::unique_ptr<TimelineWindow> timeline_;
+  std::unique_ptr<CamerasPanel> camerasPanel_;
+  std::unique_ptr<PathsPanel> pathsPanel_;
+  std::unique_ptr<ViewControlsPanel> viewControls_;
+  std::unique_ptr<PhotographWindow> photographWindow_;
+  std::unique_ptr<PropertyPanel> propertyPanel_;
+  std::unique_ptr<ColourGradingPanel> colourGradingPanel_;
   QPointer<QProgressDialog> importProgress_;
   int untitledCount_ = 0;
   int exitStatus_ = 0;

@@ -34,8 +34,8 @@ QAction* addItem(QMenu* menu, const QString& title, std::function<void()> run,
   QAction* action = menu->addAction(title);
   action->setShortcut(shortcut);
   if (!actionName.empty()) {
-    action->setProperty(kActionNameProperty, QString::fromUtf8(actionName.data(),
-                                                               static_cast<int>(actionName.size())));
+    action->setProperty(kActionNameProperty,
+                        QString::fromUtf8(actionName.data(), static_cast<int>(actionName.size())));
     markValidated({action});
   }
   QObject::connect(action, &QAction::triggered, menu, [run = std::move(run)] { run(); });
@@ -77,10 +77,12 @@ void addChoiceItems(QMenu* menu, const QStringList& titles, std::function<int()>
 
 void buildFileMenu(QMenuBar* bar, DocumentWindow& window, Application& application) {
   QMenu* file = bar->addMenu(QStringLiteral("&File"));
-  addItem(file, QStringLiteral("New"), [&application] { application.newDocument(); },
-          QKeySequence::New);
-  addItem(file, QStringLiteral("Open…"), [&application] { application.openDocumentWithPanel(); },
-          QKeySequence::Open);
+  addItem(
+      file, QStringLiteral("New"), [&application] { application.newDocument(); },
+      QKeySequence::New);
+  addItem(
+      file, QStringLiteral("Open…"), [&application] { application.openDocumentWithPanel(); },
+      QKeySequence::Open);
   QMenu* recent = file->addMenu(QStringLiteral("Open Recent"));
   QObject::connect(recent, &QMenu::aboutToShow, recent, [recent, &application] {
     recent->clear();
@@ -89,16 +91,19 @@ void buildFileMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
               [&application, path] { application.openFile(path); });
     }
     recent->addSeparator();
-    addItem(recent, QStringLiteral("Clear Menu"), [&application] {
-      application.clearRecentDocuments();
-    });
+    addItem(recent, QStringLiteral("Clear Menu"),
+            [&application] { application.clearRecentDocuments(); });
   });
   file->addSeparator();
-  addItem(file, QStringLiteral("Close"), [&window] { window.close(); }, QKeySequence::Close);
-  addItem(file, QStringLiteral("Save"), [&window] { window.save(); }, QKeySequence::Save);
-  addItem(file, QStringLiteral("Save As…"), [&window] { window.saveAs(); },
-          QKeySequence(QStringLiteral("Ctrl+Shift+S")));
-  QAction* revert = addItem(file, QStringLiteral("Revert to Saved"), [&window] { window.revert(); });
+  addItem(
+      file, QStringLiteral("Close"), [&window] { window.close(); }, QKeySequence::Close);
+  addItem(
+      file, QStringLiteral("Save"), [&window] { window.save(); }, QKeySequence::Save);
+  addItem(
+      file, QStringLiteral("Save As…"), [&window] { window.saveAs(); },
+      QKeySequence(QStringLiteral("Ctrl+Shift+S")));
+  QAction* revert =
+      addItem(file, QStringLiteral("Revert to Saved"), [&window] { window.revert(); });
   markValidated({revert});
   QObject::connect(file, &QMenu::aboutToShow, file, [revert, &window] {
     revert->setEnabled(window.session()->fileURL().has_value() &&
@@ -107,8 +112,9 @@ void buildFileMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
   file->addSeparator();
   QMenu* import = file->addMenu(QStringLiteral("Import"));
   ApplicationCommands& commands = application.commands();
-  addItem(import, QStringLiteral("Point File…"), [&commands] { commands.importPointFile(); },
-          QKeySequence(QStringLiteral("Ctrl+I")));
+  addItem(
+      import, QStringLiteral("Point File…"), [&commands] { commands.importPointFile(); },
+      QKeySequence(QStringLiteral("Ctrl+I")));
   addItem(import, QStringLiteral("RWB File…"), [&commands] { commands.importRWB(); });
   addItem(import, QStringLiteral("PLY File…"), [&application] {
     if (application.commands().importPLY()) {
@@ -122,20 +128,22 @@ void buildFileMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
   addItem(import, QStringLiteral("Camera Path (Matrices)…"),
           [&commands] { commands.importMatrixPath(); });
   file->addSeparator();
-  addItem(file, QStringLiteral("Preferences…"), [&application] { application.showPreferences(); },
-          QKeySequence::Preferences);
-  addItem(file, QStringLiteral("Quit"), [&application] { application.terminate(); },
-          QKeySequence::Quit);
+  addItem(
+      file, QStringLiteral("Preferences…"), [&application] { application.showPreferences(); },
+      QKeySequence::Preferences);
+  addItem(
+      file, QStringLiteral("Quit"), [&application] { application.terminate(); },
+      QKeySequence::Quit);
 }
 
 void buildEditMenu(QMenuBar* bar, DocumentWindow& window) {
   QMenu* edit = bar->addMenu(QStringLiteral("&Edit"));
   UndoManager& undo = window.document()->undoManager();
   // The document reports what an undo or redo changed; the panels follow.
-  QAction* undoItem = addItem(edit, QStringLiteral("Undo"), [&undo] { undo.undo(); },
-                              QKeySequence::Undo);
-  QAction* redoItem = addItem(edit, QStringLiteral("Redo"), [&undo] { undo.redo(); },
-                              QKeySequence::Redo);
+  QAction* undoItem = addItem(
+      edit, QStringLiteral("Undo"), [&undo] { undo.undo(); }, QKeySequence::Undo);
+  QAction* redoItem = addItem(
+      edit, QStringLiteral("Redo"), [&undo] { undo.redo(); }, QKeySequence::Redo);
   markValidated({undoItem, redoItem});
   QObject::connect(edit, &QMenu::aboutToShow, edit, [undoItem, redoItem, &undo] {
     undoItem->setText(QString::fromStdString(menuItemTitleForStep("Undo", undo.undoActionName())));
@@ -148,49 +156,58 @@ void buildEditMenu(QMenuBar* bar, DocumentWindow& window) {
 void buildViewMenu(QMenuBar* bar, DocumentWindow& window, Application& application) {
   QMenu* viewMenu = bar->addMenu(QStringLiteral("&View"));
   PointsDocumentGLView& view = window.glView().pointView();
-  addChoiceItems(viewMenu, {QStringLiteral("Perspective"), QStringLiteral("Orthographic"),
-                            QStringLiteral("Anaglyph")},
-                 [&view] { return view.viewMode(); }, [&view](int v) { view.setViewMode(v); });
+  addChoiceItems(
+      viewMenu,
+      {QStringLiteral("Perspective"), QStringLiteral("Orthographic"), QStringLiteral("Anaglyph")},
+      [&view] { return view.viewMode(); }, [&view](int v) { view.setViewMode(v); });
   viewMenu->actions()[0]->setShortcut(QKeySequence(QStringLiteral("Ctrl+1")));
   viewMenu->actions()[1]->setShortcut(QKeySequence(QStringLiteral("Ctrl+2")));
   viewMenu->actions()[2]->setShortcut(QKeySequence(QStringLiteral("Ctrl+3")));
   viewMenu->addSeparator();
 
   QMenu* camera = viewMenu->addMenu(QStringLiteral("Camera"));
-  addChoiceItems(camera, {QStringLiteral("Scene Camera"), QStringLiteral("Camera Path or Trackball"),
-                          QStringLiteral("Selected Camera"), QStringLiteral("Trackball")},
-                 [&view] { return view.cameraMode(); }, [&view](int v) { view.setCameraMode(v); });
+  addChoiceItems(
+      camera,
+      {QStringLiteral("Scene Camera"), QStringLiteral("Camera Path or Trackball"),
+       QStringLiteral("Selected Camera"), QStringLiteral("Trackball")},
+      [&view] { return view.cameraMode(); }, [&view](int v) { view.setCameraMode(v); });
   QMenu* presets = viewMenu->addMenu(QStringLiteral("Orthographic View"));
   QStringList presetTitles;
   for (int axis = 0; axis < 6; ++axis) {
     presetTitles << QString::fromUtf8(PointsDocumentGLView::labelForOrthoAxis(axis).data());
   }
-  addChoiceItems(presets, presetTitles,
-                 [&view] { return view.viewMode() == PointsDocumentGLView::kOrthographic
-                                      ? view.orthoAxis() : -1; },
-                 [&view](int axis) { view.cameraPreset(axis); });
+  addChoiceItems(
+      presets, presetTitles,
+      [&view] {
+        return view.viewMode() == PointsDocumentGLView::kOrthographic ? view.orthoAxis() : -1;
+      },
+      [&view](int axis) { view.cameraPreset(axis); });
   QMenu* glasses = viewMenu->addMenu(QStringLiteral("Anaglyph Glasses"));
-  addChoiceItems(glasses, {QStringLiteral("Red / Blue"), QStringLiteral("Red / Green"),
-                           QStringLiteral("Red / Cyan"), QStringLiteral("Blue / Red"),
-                           QStringLiteral("Green / Red"), QStringLiteral("Cyan / Red")},
-                 [&view] { return view.glassesType(); },
-                 [&view](int v) { view.setGlassesType(v); }, 1);
+  addChoiceItems(
+      glasses,
+      {QStringLiteral("Red / Blue"), QStringLiteral("Red / Green"), QStringLiteral("Red / Cyan"),
+       QStringLiteral("Blue / Red"), QStringLiteral("Green / Red"), QStringLiteral("Cyan / Red")},
+      [&view] { return view.glassesType(); }, [&view](int v) { view.setGlassesType(v); }, 1);
   QMenu* editing = viewMenu->addMenu(QStringLiteral("Mouse Edits"));
-  addChoiceItems(editing, {QStringLiteral("The View"), QStringLiteral("The Selected Layer"),
-                           QStringLiteral("The Light")},
-                 [&view] { return view.editMode(); }, [&view](int v) { view.setEditMode(v); });
+  addChoiceItems(
+      editing,
+      {QStringLiteral("The View"), QStringLiteral("The Selected Layer"),
+       QStringLiteral("The Light")},
+      [&view] { return view.editMode(); }, [&view](int v) { view.setEditMode(v); });
   viewMenu->addSeparator();
 
   ApplicationCommands& commands = application.commands();
-  addItem(viewMenu, QStringLiteral("Zoom In"), [&commands] { commands.menuZoomIn(); },
-          QKeySequence::ZoomIn);
-  addItem(viewMenu, QStringLiteral("Zoom Out"), [&commands] { commands.menuZoomOut(); },
-          QKeySequence::ZoomOut);
-  addItem(viewMenu, QStringLiteral("Frame Scene"), [&view] { view.frameScene(); },
-          QKeySequence(QStringLiteral("Ctrl+F")));
-  QAction* trackball = addItem(viewMenu, QStringLiteral("Show Trackball"), [&view] {
-    view.setShowTrackball(!view.showTrackball());
-  });
+  addItem(
+      viewMenu, QStringLiteral("Zoom In"), [&commands] { commands.menuZoomIn(); },
+      QKeySequence::ZoomIn);
+  addItem(
+      viewMenu, QStringLiteral("Zoom Out"), [&commands] { commands.menuZoomOut(); },
+      QKeySequence::ZoomOut);
+  addItem(
+      viewMenu, QStringLiteral("Frame Scene"), [&view] { view.frameScene(); },
+      QKeySequence(QStringLiteral("Ctrl+F")));
+  QAction* trackball = addItem(viewMenu, QStringLiteral("Show Trackball"),
+                               [&view] { view.setShowTrackball(!view.showTrackball()); });
   trackball->setCheckable(true);
   QObject::connect(viewMenu, &QMenu::aboutToShow, viewMenu,
                    [trackball, &view] { trackball->setChecked(view.showTrackball()); });
@@ -198,9 +215,9 @@ void buildViewMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
 
   addItem(viewMenu, QStringLiteral("Bookmark Camera…"), [&window, &commands] {
     bool ok = false;
-    const QString title = QInputDialog::getText(&window, QStringLiteral("Bookmark Camera"),
-                                                QStringLiteral("Bookmark title:"),
-                                                QLineEdit::Normal, QString(), &ok);
+    const QString title =
+        QInputDialog::getText(&window, QStringLiteral("Bookmark Camera"),
+                              QStringLiteral("Bookmark title:"), QLineEdit::Normal, QString(), &ok);
     if (ok && !title.isEmpty()) {
       commands.menuBookmarkCamera(title.toStdString());
     }
@@ -225,14 +242,16 @@ void buildViewMenu(QMenuBar* bar, DocumentWindow& window, Application& applicati
     }
   });
   viewMenu->addSeparator();
-  addItem(viewMenu, QStringLiteral("New View"), [&application, &window] {
-    application.openNewView(window);
-  });
-  addItem(viewMenu, QStringLiteral("Full Screen"), [&window, &view] {
-    const bool full = !window.isFullScreen();
-    full ? window.showFullScreen() : window.showNormal();
-    view.setIsFullScreen(full);
-  }, QKeySequence::FullScreen);
+  addItem(viewMenu, QStringLiteral("New View"),
+          [&application, &window] { application.openNewView(window); });
+  addItem(
+      viewMenu, QStringLiteral("Full Screen"),
+      [&window, &view] {
+        const bool full = !window.isFullScreen();
+        full ? window.showFullScreen() : window.showNormal();
+        view.setIsFullScreen(full);
+      },
+      QKeySequence::FullScreen);
 }
 
 void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& application) {
@@ -242,18 +261,24 @@ void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& applicat
   addItem(layer, QStringLiteral("Add Primitive"), [&commands] { commands.addPrimitive(); });
   addItem(layer, QStringLiteral("Add SLERP Camera Path"), [&commands] { commands.addSLERP(); });
   layer->addSeparator();
-  addItem(layer, QStringLiteral("Previous Layer"), [&commands] { commands.menuLayerPrevious(); },
-          QKeySequence(QStringLiteral("Ctrl+[")), menu_action::kLayerPrevious);
-  addItem(layer, QStringLiteral("Next Layer"), [&commands] { commands.menuLayerNext(); },
-          QKeySequence(QStringLiteral("Ctrl+]")), menu_action::kLayerNext);
+  addItem(
+      layer, QStringLiteral("Previous Layer"), [&commands] { commands.menuLayerPrevious(); },
+      QKeySequence(QStringLiteral("Ctrl+[")), menu_action::kLayerPrevious);
+  addItem(
+      layer, QStringLiteral("Next Layer"), [&commands] { commands.menuLayerNext(); },
+      QKeySequence(QStringLiteral("Ctrl+]")), menu_action::kLayerNext);
   layer->addSeparator();
-  addItem(layer, QStringLiteral("Re-randomize Buckets…"), [&application] {
-    if (application.commands().menuReRandomizeBuckets()) {
-      application.runReRandomizeSheet();
-    }
-  }, {}, menu_action::kReRandomizeBuckets);
-  addItem(layer, QStringLiteral("Re-save Layer"), [&commands] { commands.menuReSaveLayer(); }, {},
-          menu_action::kReSaveLayer);
+  addItem(
+      layer, QStringLiteral("Re-randomize Buckets…"),
+      [&application] {
+        if (application.commands().menuReRandomizeBuckets()) {
+          application.runReRandomizeSheet();
+        }
+      },
+      {}, menu_action::kReRandomizeBuckets);
+  addItem(
+      layer, QStringLiteral("Re-save Layer"), [&commands] { commands.menuReSaveLayer(); }, {},
+      menu_action::kReSaveLayer);
   addItem(layer, QStringLiteral("Bake Transformation"),
           [&commands] { commands.bakeTransformation(); });
   layer->addSeparator();
@@ -262,11 +287,16 @@ void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& applicat
     view.beginAnimatingWithCameraPath(
         std::dynamic_pointer_cast<CameraPath>(window.document()->selectedLayer()));
   });
-  QAction* stop = addItem(layer, QStringLiteral("Stop Playback"), [&view] { view.stopAnimating(); });
-  markValidated({play, stop});
-  QObject::connect(layer, &QMenu::aboutToShow, layer, [play, stop, &window, &view] {
-    play->setEnabled(std::dynamic_pointer_cast<CameraPath>(window.document()->selectedLayer()) !=
-                     nullptr);
+  QAction* stop =
+      addItem(layer, QStringLiteral("Stop Playback"), [&view] { view.stopAnimating(); });
+  QAction* renderPath = addItem(layer, QStringLiteral("Render Camera Path"),
+                                [&application, &window] { application.renderCameraPath(window); });
+  markValidated({play, stop, renderPath});
+  QObject::connect(layer, &QMenu::aboutToShow, layer, [play, stop, renderPath, &window, &view] {
+    const bool path =
+        std::dynamic_pointer_cast<CameraPath>(window.document()->selectedLayer()) != nullptr;
+    play->setEnabled(path);
+    renderPath->setEnabled(path);
     stop->setEnabled(view.isAnimating());
   });
   validateOnShow(layer, application);
@@ -276,10 +306,24 @@ void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& applicat
 // front document.
 void buildWindowMenu(QMenuBar* bar, DocumentWindow& window, Application& application) {
   QMenu* windows = bar->addMenu(QStringLiteral("&Window"));
-  addItem(windows, QStringLiteral("Minimize"), [&window] { window.showMinimized(); },
-          QKeySequence(QStringLiteral("Ctrl+M")));
+  addItem(
+      windows, QStringLiteral("Minimize"), [&window] { window.showMinimized(); },
+      QKeySequence(QStringLiteral("Ctrl+M")));
   windows->addSeparator();
-  (void)application;
+  addItem(
+      windows, QStringLiteral("Timeline"), [&application] { application.showTimeline(); },
+      QKeySequence(QStringLiteral("Ctrl+T")));
+  addItem(windows, QStringLiteral("Cameras"), [&application] { application.showCamerasPanel(); });
+  addItem(windows, QStringLiteral("Camera Paths"),
+          [&application] { application.showPathsPanel(); });
+  addItem(windows, QStringLiteral("View Controls"),
+          [&application] { application.showViewControls(); });
+  addItem(windows, QStringLiteral("Photograph"),
+          [&application] { application.showPhotographWindow(); });
+  addItem(windows, QStringLiteral("Properties"),
+          [&application] { application.showPropertyPanel(); });
+  addItem(windows, QStringLiteral("Colour Grading"),
+          [&application] { application.showColourGradingPanel(); });
 }
 
 }  // namespace
