@@ -86,8 +86,8 @@ const PropertyTable& SourceCamera::properties() const {
 
 void SourceCamera::setImagePath(const std::filesystem::path& path) {
   texture_.reset();
-  photographFile_.clear();
-  photographPath_ = path;
+  // Kept even when it cannot be read, to say which file is missing.
+  photographFile_ = path;
   decodeFailed_ = false;
   imageWidth_ = 0;
   imageHeight_ = 0;
@@ -96,7 +96,6 @@ void SourceCamera::setImagePath(const std::filesystem::path& path) {
     setHasImage(false);
     return;
   }
-  photographFile_ = path;
   imageWidth_ = w;
   imageHeight_ = h;
   setAspect(static_cast<float>(w) / static_cast<float>(h));
@@ -233,7 +232,6 @@ void SourceCamera::copyInto(Animatable3DObject& target) const {
   camera.imageWidth_ = imageWidth_;
   camera.imageHeight_ = imageHeight_;
   camera.photographFile_ = photographFile_;
-  camera.photographPath_ = photographPath_;
   camera.decodeFailed_ = decodeFailed_;
   if (hasImage_) {
     camera.setAspect(aspect());

@@ -52,7 +52,7 @@ class SourceCamera : public Camera {
   // The file last named for the photograph, kept even when it could not be
   // read, so that the photograph window can say which file is missing;
   // empty when none was named. Not archived, like the photograph.
-  const std::filesystem::path& photographPath() const { return photographPath_; }
+  const std::filesystem::path& photographPath() const { return photographFile_; }
   bool hasImage() const { return hasImage_; }
   void setHasImage(bool v) { changeValueForKey("hasImage", hasImage_, v); }
   int imageWidth() const { return imageWidth_; }
@@ -106,9 +106,9 @@ class SourceCamera : public Camera {
   bool hasImage_ = false;
   int imageWidth_ = 0;
   int imageHeight_ = 0;
-  // Where the photograph is decoded from when the texture is made.
+  // Where the photograph is decoded from when the texture is made (only
+  // while hasImage says it could be read).
   std::filesystem::path photographFile_;
-  std::filesystem::path photographPath_;
   bool decodeFailed_ = false;
   gl::GLName texture_;
 };
