@@ -1,6 +1,7 @@
 // Rendering from the desktop application as a person does it: the settings
 // sheet filled in with the mouse and keyboard, the progress sheet shown
-// while the timeline's frames are written and its cancel stopping the run,
+// while the timeline's frames are written (the same frames the command line
+// renders from the saved document) and its cancel stopping the run,
 // the spline editor's knots placed and dragged, and a camera path rendered
 // from the Layer menu.
 
@@ -27,10 +28,12 @@
 
 #include "app/app_fixture.h"
 #include "app/spline_editor_window.h"
+#include "scene/document_session.h"
 #include "camera/zxy_camera_path.h"
 #include "render/frame_pattern.h"
 #include "render/gl/image_file.h"
 #include "scene/my_document.h"
+#include "support/cli_runner.h"
 #include "timeline/spline.h"
 #include "timeline/timeline.h"
 #include "timeline/timeline_window_controller.h"
@@ -157,6 +160,20 @@ TEST_F(RenderSheetsTest, TheSettingsSheetRendersEveryFrameOfTheTimelineIntoTheCh
   }
   EXPECT_EQ(redLeft, 0);
   EXPECT_GT(redRight, 0);
+
+  // The saved document rendered by the command line gives the same frames.
+  Error saveError;
+  ASSERT_TRUE(window.session()->saveToURL(dir / "square.reel", &saveError)) << saveError.message;
+  const auto run = testing::runProgram(dir.path(), {CLOUDREEL_BINARY, "render", "square.reel",
+                                                    "--out", "cli", "--size", "64x48"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  ASSERT_EQ(testing::fileNamesIn(dir / "cli"), framesNamed(0, 4));
+  for (const std::string& name : framesNamed(0, 4)) {
+    const auto fromSheet = gl::readTiff(folder / name);
+    const auto fromCommand = gl::readTiff(dir / "cli" / name);
+    ASSERT_TRUE(fromSheet && fromCommand);
+    EXPECT_EQ(fromSheet->samples, fromCommand->samples) << name;
+  }
 }
 
 TEST_F(RenderSheetsTest, CancellingStopsTheRunAfterTheFrameInFlightAndMarksNeedSetting) {
