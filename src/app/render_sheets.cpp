@@ -295,25 +295,31 @@ RenderProgressSheet* runTimelineRender(QWidget* window, TimelineWindowController
       return nullptr;
     }
   }
+  // The run reports its end from the main loop, never from inside
+  // renderTimeline, so the sheet it closes can be made once it has started.
+  auto progress = std::make_shared<RenderProgressController>();
+  auto shown = std::make_shared<QPointer<RenderProgressSheet>>();
   Error error;
-  if (!renderRangeForSelection(*animation, settings.renderRangeSelected(), &error)) {
-    UserInteraction::shared().runAlert(Alert{"The render cannot start", error.message, {}});
+  const auto run = timeline.renderTimeline(
+      settings, progress,
+      [shown](bool) {
+        if (*shown) {
+          (*shown)->finish();
+        }
+      },
+      &error);
+  if (!run) {
+    if (error.message.empty()) {
+      UserInteraction::shared().beep();
+    } else {
+      UserInteraction::shared().runAlert(Alert{"The render cannot start", error.message, {}});
+    }
     return nullptr;
   }
-  auto progress = std::make_shared<RenderProgressController>();
   auto* sheet = new RenderProgressSheet(progress, window);
   sheet->setAttribute(Qt::WA_DeleteOnClose);
   sheet->open();
-  const QPointer<RenderProgressSheet> shown(sheet);
-  const auto run = timeline.renderTimeline(settings, progress, [shown](bool) {
-    if (shown) {
-      shown->finish();
-    }
-  });
-  if (!run) {
-    sheet->finish();
-    return nullptr;
-  }
+  *shown = sheet;
   return sheet;
 }
 

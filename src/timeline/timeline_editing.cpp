@@ -115,25 +115,13 @@ void TimelineDragEdit::apply(float dt) {
 
 namespace {
 
-struct Times {
-  std::shared_ptr<TimelineClip> clip;
-  float begin;
-  float duration;
-};
-
-std::vector<Times> timesOf(const std::vector<std::shared_ptr<TimelineClip>>& clips) {
-  std::vector<Times> times;
-  for (const auto& clip : clips) {
-    times.push_back({clip, clip->begin(), clip->duration()});
-  }
-  return times;
-}
+using Span = TimelineDragEdit::Span;
 
 // Sets the times and registers the step that sets the others back: run as
 // an undo, that registration becomes the redo.
-void restoreTimes(UndoManager& undo, const std::string& name, const std::vector<Times>& to,
-                  const std::vector<Times>& from, const std::function<void()>& changed) {
-  for (const Times& t : to) {
+void restoreTimes(UndoManager& undo, const std::string& name, const std::vector<Span>& to,
+                  const std::vector<Span>& from, const std::function<void()>& changed) {
+  for (const Span& t : to) {
     t.clip->setBegin(t.begin);
     t.clip->setDuration(t.duration);
   }
@@ -151,20 +139,18 @@ bool TimelineDragEdit::commit(UndoManager* undoManager, std::function<void()> ch
   if (moving_.empty() || moved_ == 0.0f) {
     return false;
   }
-  std::vector<std::shared_ptr<TimelineClip>> touched;
-  std::vector<Times> was;
-  for (const Span& s : moving_) {
-    touched.push_back(s.clip);
-    was.push_back({s.clip, s.begin, s.duration});
-  }
+  // What the drag changed, as it was and as it is now.
+  std::vector<Span> was = moving_;
   for (const auto& side : {before_, after_}) {
     if (side) {
-      touched.push_back(side->clip);
-      was.push_back({side->clip, side->begin, side->duration});
+      was.push_back(*side);
     }
   }
   if (undoManager != nullptr) {
-    const std::vector<Times> now = timesOf(touched);
+    std::vector<Span> now;
+    for (const Span& s : was) {
+      now.push_back({s.clip, s.clip->begin(), s.clip->duration()});
+    }
     const std::string name = isControlPoint() ? "Move Control Point" : "Slide Clip";
     undoManager->registerUndoWithTarget(undoManager, [undoManager, name, was, now, changed] {
       restoreTimes(*undoManager, name, was, now, changed);

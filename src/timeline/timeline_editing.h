@@ -32,6 +32,13 @@ class UndoManager;
 
 class TimelineDragEdit {
  public:
+  // An element of the track with its times.
+  struct Span {
+    std::shared_ptr<TimelineClip> clip;
+    float begin;
+    float duration;
+  };
+
   // The element is a control point or a span of the track; anything else
   // (an element not in the track) makes a drag that moves nothing.
   TimelineDragEdit(std::shared_ptr<TimelineTrack> track, std::shared_ptr<TimelineClip> element,
@@ -53,11 +60,6 @@ class TimelineDragEdit {
   void cancel() { moveTo(0.0f); }
 
  private:
-  struct Span {
-    std::shared_ptr<TimelineClip> clip;
-    float begin;
-    float duration;
-  };
   // The earliest and latest offsets the neighbours allow.
   void findLimits();
   void apply(float dt);

@@ -10,8 +10,8 @@
 #include "render/offline_gl_renderer.h"
 #include "render/render_properties_controller.h"
 #include "scene/my_document.h"
-#include "timeline/render_run.h"
 #include "timeline/edit_point.h"
+#include "timeline/render_run.h"
 #include "timeline/timeline.h"
 #include "timeline/timeline_clip.h"
 #include "timeline/timeline_track.h"
@@ -407,23 +407,24 @@ std::optional<TimelineDrag> TimelineWindowController::mouseDown(Point2D point, c
 
 std::shared_ptr<RenderRun> TimelineWindowController::renderTimeline(
     const RenderPropertiesController& settings, std::shared_ptr<RenderProgressController> progress,
-    std::function<void(bool cancelled)> finished) {
+    std::function<void(bool cancelled)> finished, Error* error) {
   const std::shared_ptr<Timeline> tl = timeline();
   if (document_ == nullptr || !tl) {
     return nullptr;
   }
   MyDocument& document = *document_;
-  const RenderFrameRange range = settings.renderRangeSelected() ==
-                                         static_cast<int>(RenderRange::WholeTimeline)
-                                     ? wholeTimelineRange(*tl)
-                                     : markedRange(*tl);
+  const std::optional<RenderFrameRange> range =
+      renderRangeForSelection(*tl, settings.renderRangeSelected(), error);
+  if (!range) {
+    return nullptr;
+  }
   const std::shared_ptr<SceneCamera> camera = document.sceneCamera();
   std::unique_ptr<OfflineGLRenderer> renderer;
   if (const auto context = document.sharedGLContext()) {
     renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
-        OpenGLScene::initWithWidthHeightFieldOfViewZNearZFar(
-            settings.width(), settings.height(), camera ? camera->fieldOfView() : 45.0,
-            settings.zNear(), settings.zFar()),
+        OpenGLScene::initWithWidthHeightFieldOfViewZNearZFar(settings.width(), settings.height(),
+                                                             camera ? camera->fieldOfView() : 45.0,
+                                                             settings.zNear(), settings.zFar()),
         *context, settings.shouldRenderDepth());
   }
   if (renderer) {
@@ -444,7 +445,7 @@ std::shared_ptr<RenderRun> TimelineWindowController::renderTimeline(
     return camera;
   };
   hooks.finished = std::move(finished);
-  auto run = RenderRun::create(document, std::move(renderer), range, std::move(hooks), runLoop_);
+  auto run = RenderRun::create(document, std::move(renderer), *range, std::move(hooks), runLoop_);
   run->start();
   return run;
 }

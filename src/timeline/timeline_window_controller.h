@@ -17,6 +17,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/error.h"
 #include "platform/object.h"
 #include "platform/plane.h"
 #include "platform/run_loop.h"
@@ -170,10 +171,13 @@ class TimelineWindowController : public Object, public Observer {
   // is drawn. The progress sheet shows each frame, its cancel ends the run
   // before the next frame, and `finished` is called once at the end. A
   // renderer that cannot be made draws nothing, and the run still walks its
-  // range. Answers the run; null without a document.
+  // range. Answers the run; null without a document, and null with the
+  // reason in `error` when the marked range is chosen but cannot be
+  // rendered (see renderRangeForSelection).
   std::shared_ptr<RenderRun> renderTimeline(const RenderPropertiesController& settings,
                                             std::shared_ptr<RenderProgressController> progress,
-                                            std::function<void(bool cancelled)> finished = {});
+                                            std::function<void(bool cancelled)> finished = {},
+                                            Error* error = nullptr);
 
   // --- a click in the track area. The point is in the view's coordinates;
   // the time is x / pixelsPerSecond, and the track is the timeline's row

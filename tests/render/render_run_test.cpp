@@ -228,8 +228,6 @@ TEST_F(RenderRunTest, CancelStopsBeforeTheNextFrameAfterFinishingTheOneInFlight)
 TEST_F(RenderRunTest, TheTimelineWindowRendersTheMarkedRangeWithTheSheetsSettings) {
   TimelineWindowController controller(loop);
   controller.setDocument(&document);
-  document.timeline()->setInPoint(0.2f);
-  document.timeline()->setOutPoint(0.5f);
   RenderPropertiesController settings;
   settings.setWidth(24);
   settings.setHeight(16);
@@ -238,6 +236,13 @@ TEST_F(RenderRunTest, TheTimelineWindowRendersTheMarkedRangeWithTheSheetsSetting
   settings.setOutputPattern(*FramePattern::parse("f%d.tif"));
   settings.setShouldRenderDepth(true);
   const auto progress = std::make_shared<RenderProgressController>();
+  // Without both marks the marked range is refused, with the reason.
+  document.timeline()->setInPoint(0.2f);
+  Error refused;
+  EXPECT_FALSE(controller.renderTimeline(settings, progress, {}, &refused));
+  EXPECT_NE(refused.message.find("set both the in and the out mark"), std::string::npos);
+  EXPECT_TRUE(filesWritten().empty());
+  document.timeline()->setOutPoint(0.5f);
   const auto run = controller.renderTimeline(settings, progress, [this](bool c) { cancelled = c; });
   ASSERT_TRUE(run);
   ASSERT_TRUE(loop.runUntil([&] { return cancelled.has_value(); }, 60s));
