@@ -14,8 +14,10 @@
 #include "import/bundler_file.h"
 #include "import/ply_file.h"
 #include "platform/class_registry.h"
+#include "scene/animated_card.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_3d.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
@@ -34,12 +36,14 @@ void registerCoreClasses(ClassRegistry& registry) {
   registerGeometryClasses(registry);
   registry.registerClass<Layer>("Layer");
   registry.registerClass<AnimatedLayer>("AnimatedLayer");
+  registry.registerClass<AnimatedCard>("AnimatedCard");
   registry.registerClass<LightSource>("LightSource");
   registry.registerClass<Sphere>("Sphere");
   registry.registerClass<Point3D>("Point3D");
   registry.registerClass<PointLayer>("PointLayer");
   registry.registerClass<PLYFile>("PLYFile");
   registry.registerClass<BundlerFile>("BundlerFile");
+  registry.registerClass<OceanFFT>("OceanFFT");
   registry.registerClass<Camera>("Camera");
   registry.registerClass<SceneCamera>("SceneCamera");
   registry.registerClass<SourceCamera>("SourceCamera");

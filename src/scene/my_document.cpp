@@ -116,19 +116,24 @@ const PropertyTable& MyDocument::properties() const {
 // --- change reporting
 
 void MyDocument::hasChanged() {
-  if (enableViewUpdates_) {
-    if (playbackView_ != nullptr) {
-      playbackView_->setNeedsDisplay();
-    } else {
-      // A copy: a view may remove itself while redrawing.
-      const std::vector<DocumentView*> views = views_;
-      for (DocumentView* view : views) {
-        view->setNeedsDisplay();
-      }
-    }
-  }
+  redrawViews();
   NotificationCenter::defaultCenter().postNotificationName(std::string(kDocumentChangeNotification),
                                                            this);
+}
+
+void MyDocument::redrawViews() {
+  if (!enableViewUpdates_) {
+    return;
+  }
+  if (playbackView_ != nullptr) {
+    playbackView_->setNeedsDisplay();
+    return;
+  }
+  // A copy: a view may remove itself while redrawing.
+  const std::vector<DocumentView*> views = views_;
+  for (DocumentView* view : views) {
+    view->setNeedsDisplay();
+  }
 }
 
 void MyDocument::handleGridColorChange(const Notification&) { hasChanged(); }

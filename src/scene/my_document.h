@@ -103,6 +103,9 @@ class MyDocument : public Object, public Observer {
   // Redraws the views (only the playback view while one is set) when view
   // updates are on, then posts the change notification in any case.
   void hasChanged();
+  // Only the redraw half of hasChanged: for what changes the picture but
+  // not the document (a picture that finished decoding).
+  void redrawViews();
   void handleGridColorChange(const Notification& notification);
   bool enableViewUpdates() const { return enableViewUpdates_; }
   void setEnableViewUpdates(bool v) {

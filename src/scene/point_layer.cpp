@@ -297,7 +297,7 @@ void PointLayer::copyInto(Animatable3DObject& target) const {
 
 void PointLayer::encodeWithCoder(KeyedArchiver& coder) const {
   Layer::encodeWithCoder(coder);
-  if (!fileStoredAsLink_) {
+  if (archivesPointRecords()) {
     const std::size_t bytes = std::min(byteSize(), points_ ? points_->size() : 0);
     coder.encodeBytes({points(), bytes}, "points");
   }
@@ -367,6 +367,10 @@ void PointLayer::initWithCoder(KeyedUnarchiver& coder) {
       UserInteraction::shared().presentError(error);
       coder.failWithError(error);
     }
+    return;
+  }
+  if (!archivesPointRecords()) {
+    nPoints_ = 0;
     return;
   }
   // Inline records are 16 bytes even when "hasNormals" is set. A count the

@@ -241,6 +241,9 @@ class PointLayer : public Layer {
   // it through the layer's own reader; a load error is presented to the
   // user and answers false.
   bool loadFromURL(const std::filesystem::path& url, bool shouldLink);
+  // Whether the archive carries the records: for an inline layer, unless
+  // the layer computes its records from what it archives instead.
+  virtual bool archivesPointRecords() const { return !fileStoredAsLink_; }
   void setPointArray(std::shared_ptr<PointArray> array, std::int32_t count);
   // Call after changing records in place, so that a drawing built later
   // does not reuse points uploaded before.

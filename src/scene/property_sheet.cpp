@@ -13,9 +13,11 @@
 #include "camera/slerp_camera_path.h"
 #include "platform/color.h"
 #include "platform/log.h"
+#include "scene/animated_card.h"
 #include "scene/layer.h"
 #include "scene/light_source.h"
 #include "scene/my_document.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
 
@@ -159,6 +161,35 @@ std::vector<PropertyField> primitiveFields() {
           observed(number("size", "Size", 0.001, 1000.0, 0.1, 3), "Change Size"),
           observed(integer("segments", "Segments", 3.0, 256.0), "Change Segments"),
           observed(colour("color", "Colour"), "Change Colour")};
+}
+
+std::vector<PropertyField> oceanFields() {
+  // The grid takes powers of two only: the layer moves any other number to
+  // the nearest one.
+  return {observed(
+              integer("gridSize", "Grid", OceanSpectrum::kMinGridSize, OceanSpectrum::kMaxGridSize),
+              "Change Grid Size"),
+          observed(number("patchSize", "Tile Size", 0.1, 10000.0, 1.0, 1), "Change Patch Size"),
+          observed(number("windSpeed", "Wind Speed", 0.0, 100.0, 0.5, 1), "Change Wind Speed"),
+          observed(number("windDirection", "Wind Direction", -360.0, 360.0, 5.0, 0),
+                   "Change Wind Direction"),
+          observed(number("amplitude", "Amplitude", 0.0, 1.0, 0.0005, 4), "Change Amplitude"),
+          observed(number("choppiness", "Choppiness", 0.0, 5.0, 0.1, 2), "Change Choppiness"),
+          observed(integer("seed", "Seed", 0.0, 2147483647.0), "Change Seed"),
+          number("time", "Time", -1.0e6, 1.0e6, 0.04, 2),
+          observed(colour("fixedColor", "Colour"), "Change Colour"),
+          observed(boolean("drawWireFrame", "Wireframe"), "Wireframe"),
+          readOnly(integer("nPoints", "Vertices", 0.0, 2147483647.0))};
+}
+
+std::vector<PropertyField> cardFields() {
+  return {observed(text("imagePath", "Picture"), "Change Picture"),
+          readOnly(text("sourceError", "Problem")),
+          observed(number("cardHeight", "Height", 0.0, 10000.0, 0.1, 3), "Change Size"),
+          observed(number("opacity", "Opacity", 0.0, 1.0, 0.05, 2), "Change Opacity"),
+          observed(integer("FPS", "Frame Rate", 1.0, 1000.0), "Change Frame Rate"),
+          observed(integer("frameOffset", "Frame Offset", -1.0e6, 1.0e6), "Change Frame Offset"),
+          readOnly(integer("nFrames", "Frames", 0.0, 2147483647.0))};
 }
 
 std::vector<PropertyField> positionFields(const std::string& prefix) {
@@ -316,7 +347,11 @@ std::vector<PropertySection> PropertySheet::sectionsForObject(
     return sections;
   }
   addSection(sections, object, "Layer", layerFields());
-  if (const auto points = std::dynamic_pointer_cast<PointLayer>(layer)) {
+  if (std::dynamic_pointer_cast<OceanFFT>(layer)) {
+    addSection(sections, object, "Ocean", oceanFields());
+  } else if (std::dynamic_pointer_cast<AnimatedCard>(layer)) {
+    addSection(sections, object, "Card", cardFields());
+  } else if (const auto points = std::dynamic_pointer_cast<PointLayer>(layer)) {
     addSection(sections, object, "Point", pointFields(*points));
   } else if (std::dynamic_pointer_cast<Sphere>(layer)) {
     addSection(sections, object, "Primitive Properties", primitiveFields());

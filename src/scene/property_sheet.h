@@ -2,9 +2,9 @@
 // The property sheet: what the properties panel shows for the object being
 // edited, described without any toolkit. An object yields sections (the
 // common "Layer" settings, then those of its kind: "Point", "Primitive
-// Properties", "Path", "SLERP", "Cameras", "Camera"), each a list of fields
-// naming a key (or key path) of the object, a title, the kind of control
-// and its range. Reading and writing go through key-value coding, so the
+// Properties", "Ocean", "Card", "Path", "SLERP", "Cameras", "Camera"),
+// each a list of fields naming a key (or key path) of the object, a title,
+// the kind of control and its range. Reading and writing go through key-value coding, so the
 // sheet needs no code per property.
 //
 // A write is one undo step named after the field ("Change Point Size").
