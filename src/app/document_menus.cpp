@@ -259,6 +259,8 @@ void buildLayerMenu(QMenuBar* bar, DocumentWindow& window, Application& applicat
   ApplicationCommands& commands = application.commands();
   addItem(layer, QStringLiteral("Add Point"), [&commands] { commands.addPoint(); });
   addItem(layer, QStringLiteral("Add Primitive"), [&commands] { commands.addPrimitive(); });
+  addItem(layer, QStringLiteral("Add Ocean"), [&commands] { commands.addOcean(); });
+  addItem(layer, QStringLiteral("Add Picture Card…"), [&commands] { commands.import2DCard(); });
   addItem(layer, QStringLiteral("Add SLERP Camera Path"), [&commands] { commands.addSLERP(); });
   layer->addSeparator();
   addItem(

@@ -48,6 +48,7 @@ ImportOptionsPanel::ImportOptionsPanel(ViewForSelection viewForSelection, QWidge
   pages_->addWidget(pointFilePage());
   pages_->addWidget(bundlerPage());
   pages_->addWidget(plyPage());
+  pages_->addWidget(cardPage());
   auto* layout = new QVBoxLayout(this);
   layout->setContentsMargins(0, 0, 0, 0);
   layout->addWidget(pages_);
@@ -89,6 +90,11 @@ QWidget* ImportOptionsPanel::plyPage() {
   row->addWidget(plyFactor_);
   row->addStretch();
   return page({link, downsampleRow});
+}
+
+QWidget* ImportOptionsPanel::cardPage() {
+  return page({defaultsCheckBox(QStringLiteral("Show the numbered sequence the picture belongs to"),
+                                kOpenCardAsSequenceKey)});
 }
 
 void ImportOptionsPanel::attachTo(QFileDialog& dialog) {

@@ -1,6 +1,6 @@
 #pragma once
 // The import commands' options inside their open panel: one page of
-// controls per file kind (point file, reconstruction, PLY), switched as the
+// controls per file kind (point file, reconstruction, PLY, picture card), switched as the
 // panel's selection changes. The controls read and write the import options
 // in the user defaults as they change, so the command that runs when the
 // panel closes reads what the user left.
@@ -35,6 +35,7 @@ class ImportOptionsPanel : public QWidget {
   QWidget* pointFilePage();
   QWidget* bundlerPage();
   QWidget* plyPage();
+  QWidget* cardPage();
 
   ViewForSelection viewForSelection_;
   ImportOptionsView shown_ = ImportOptionsView::None;

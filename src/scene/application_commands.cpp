@@ -16,12 +16,17 @@
 #include "platform/log.h"
 #include "platform/notification_center.h"
 #include "platform/run_loop.h"
+#include "platform/undo_manager.h"
 #include "platform/user_defaults.h"
 #include "platform/user_interaction.h"
+#include "scene/animated_card.h"
 #include "scene/layer.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_3d.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
+#include "timeline/timeline_editing.h"
+#include "timeline/timeline_track.h"
 
 namespace cloudreel {
 
@@ -461,6 +466,63 @@ void ApplicationCommands::addNewLayer(std::shared_ptr<Layer> layer,
 void ApplicationCommands::addPoint() { addNewLayer(std::make_shared<Point3D>(), nullptr); }
 
 void ApplicationCommands::addPrimitive() { addNewLayer(std::make_shared<Sphere>(), nullptr); }
+
+void ApplicationCommands::addOcean() {
+  const auto document = theDocument();
+  if (!document) {
+    return;
+  }
+  auto ocean = std::make_shared<OceanFFT>();
+  UndoManager& undo = document->undoManager();
+  undo.beginUndoGrouping();
+  addNewLayer(ocean, nullptr);
+  // An ocean that stood still until the user found its Time track would
+  // look broken: it follows the timeline from the start.
+  addTrackToDocument(*document, std::make_shared<TimelineTrack>(ocean, "frame", "Time"));
+  undo.setActionName("Add Ocean");
+  undo.endUndoGrouping();
+}
+
+std::string cardSourceForFile(const std::filesystem::path& file, bool asSequence) {
+  const std::string name = file.filename().string();
+  const std::size_t end = name.find_last_of("0123456789");
+  if (!asSequence || end == std::string::npos) {
+    return file.string();
+  }
+  std::size_t begin = end;
+  while (begin > 0 && name[begin - 1] >= '0' && name[begin - 1] <= '9') {
+    --begin;
+  }
+  std::string pattern;
+  // A '%' of the name itself must stay a literal one in the pattern.
+  for (std::size_t i = 0; i < begin; ++i) {
+    pattern += name[i] == '%' ? std::string("%%") : std::string(1, name[i]);
+  }
+  const std::size_t width = end - begin + 1;
+  pattern += width > 1 ? "%0" + std::to_string(width) + "d" : std::string("%d");
+  for (std::size_t i = end + 1; i < name.size(); ++i) {
+    pattern += name[i] == '%' ? std::string("%%") : std::string(1, name[i]);
+  }
+  return (file.parent_path() / pattern).string();
+}
+
+void ApplicationCommands::import2DCard() {
+  if (!theDocument()) {
+    return;
+  }
+  if (const auto url = chooseFile(ImportOptionsView::Card)) {
+    const bool sequence = UserDefaults::standardUserDefaults().boolForKey(kOpenCardAsSequenceKey);
+    auto card = std::make_shared<AnimatedCard>();
+    card->setImagePath(cardSourceForFile(absolutePath(*url), sequence));
+    if (!card->sourceError().empty()) {
+      UserInteraction::shared().presentError(
+          Error{std::string(kApplicationErrorDomain), 1, card->sourceError()});
+      return;
+    }
+    card->setName(url->stem().string());
+    addNewLayer(card, nullptr);
+  }
+}
 
 void ApplicationCommands::addSLERP() {
   auto path = std::make_shared<SLERPCameraPath>();

@@ -39,7 +39,7 @@ PointFileKind pointFileKindForExtension(std::string_view extension);
 PointFileKind pointFileKindForPath(const std::filesystem::path& path);
 
 // The options view an open panel shows beside the selected file.
-enum class ImportOptionsView { None, PointFile, Bundler, Ply };
+enum class ImportOptionsView { None, PointFile, Bundler, Ply, Card };
 // For the point-file import: follows the selected file's extension.
 ImportOptionsView importOptionsViewForFile(const std::filesystem::path& selected);
 
@@ -55,6 +55,14 @@ inline constexpr std::string_view kOpenRWBFileAsReferenceKey = "openRWBFileAsRef
 inline constexpr std::string_view kOpenPLYFileAsReferenceKey = "openPLYFileAsReference";
 inline constexpr std::string_view kOpenPLYDownsampleKey = "openPLYDownsample";
 inline constexpr std::string_view kOpenPLYDownsampleFactorKey = "openPLYDownsampleFactor";
+// The card import shows the whole numbered sequence of the chosen picture.
+inline constexpr std::string_view kOpenCardAsSequenceKey = "openCardAsSequence";
+
+// What a card shows for a chosen picture: the picture itself, or, as a
+// sequence, a pattern with the last run of digits in the file's name
+// replaced by a conversion of that width (shot_0042.png gives
+// shot_%04d.png). A name without digits is a picture either way.
+std::string cardSourceForFile(const std::filesystem::path& file, bool asSequence);
 
 struct ImportOptions {
   bool openPointFileAsReference = false;
@@ -211,6 +219,12 @@ class ApplicationCommands : public Object, public ApplicationDelegate, public Ob
   // --- add commands: a new object through addLayer
   void addPoint();
   void addPrimitive();
+  // An ocean, with a "Time" track so that its waves move as the timeline
+  // plays: one undo step, "Add Ocean".
+  void addOcean();
+  // A card showing the picture (or its numbered sequence, as the panel's
+  // option says) that an open panel chooses; a cancel adds nothing.
+  void import2DCard();
   // Also joins the document's stored camera paths.
   void addSLERP();
 
