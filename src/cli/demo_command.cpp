@@ -30,8 +30,10 @@
 #include "render/offline_gl_renderer.h"
 #include "render/opengl_scene.h"
 #include "render/render_properties_controller.h"
+#include "scene/animated_card.h"
 #include "scene/light_source.h"
 #include "scene/my_document.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_3d.h"
 #include "scene/point_layer.h"
 #include "scene/sphere.h"
@@ -366,6 +368,31 @@ std::shared_ptr<TimelineTrack> rampTrack(const std::shared_ptr<PointLayer>& laye
   return true;
 }
 
+// An ocean below the scene, reaching past the ground on every side, whose
+// waves roll through the flight; and, standing to the right of the house,
+// a card showing the first camera's photograph.
+void addOceanAndCard(MyDocument& document, const fs::path& root) {
+  const DemoLandmarks landmarks = demoLandmarks();
+  auto ocean = std::make_shared<OceanFFT>();
+  ocean->setPatchSize(80.0f);
+  ocean->setWindSpeed(7.0f);
+  ocean->setWindDirection(30.0f);
+  // Calm enough that no crest reaches the ground.
+  ocean->setAmplitude(0.0015f);
+  ocean->objectToWorld()->setTranslation(landmarks.oceanCentre);
+  document.addLayer(ocean);
+  auto waves = std::make_shared<TimelineTrack>(ocean, "frame", "Time");
+  waves->addDefaultClipAtTime(0.0f, kFlightSeconds);
+  document.timeline()->addTrack(waves);
+
+  auto card = std::make_shared<AnimatedCard>();
+  card->setName("Photograph");
+  card->setImagePath(absolutePath(root / photographName(0)).string());
+  card->setCardHeight(2.4f);
+  card->objectToWorld()->setTranslation(landmarks.card);
+  document.addLayer(card);
+}
+
 int failed(const Error& error) {
   reportFailure(error.message);
   return 1;
@@ -446,7 +473,11 @@ int runDemoCommand(const DemoOptions& options) {
   start = Clock::now();
   const fs::path documentPath = root / "demo.reel";
   made.willMake(documentPath);
-  if (!animate(document, layer, &error) || !writeDocument(document, documentPath, &error)) {
+  if (!animate(document, layer, &error)) {
+    return failed(error);
+  }
+  addOceanAndCard(document, root);
+  if (!writeDocument(document, documentPath, &error)) {
     return failed(error);
   }
   made.keep();

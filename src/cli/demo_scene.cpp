@@ -594,7 +594,9 @@ DemoLandmarks demoLandmarks() {
   return {toWorld({3.2, 3.55, -3.4}),
           0.7,
           toWorld({kHouseX, 0.1, kHouseZ + kHouseDepth / 2 + 0.35}),
-          {5.0, 10.0, 7.0}};
+          {5.0, 10.0, 7.0},
+          toWorld({0.0, -1.2, 0.0}),
+          toWorld({8.6, 2.2, -1.5})};
 }
 
 std::vector<DemoPose> flightPoses(int frames) {

@@ -98,6 +98,10 @@ struct DemoLandmarks {
   double ornamentSize;
   DemoVector marker;
   DemoVector light;
+  // The ocean's middle, below the ground's; where the photograph card
+  // stands.
+  DemoVector oceanCentre;
+  DemoVector card;
 };
 DemoLandmarks demoLandmarks();
 

@@ -16,8 +16,10 @@
 #include "cli/json_output.h"
 #include "cli/point_cloud_input.h"
 #include "geometry/vector3.h"
+#include "scene/animated_card.h"
 #include "scene/layer.h"
 #include "scene/my_document.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_layer.h"
 #include "timeline/timeline.h"
 #include "timeline/timeline_clip.h"
@@ -37,6 +39,28 @@ bool isAncestor(const std::vector<const Layer*>& ancestors, const Layer* layer) 
 
 // The counts that say what a layer holds, by kind.
 void addLayerCounts(Json& json, const Layer& layer) {
+  if (const auto* ocean = dynamic_cast<const OceanFFT*>(&layer)) {
+    // The surface is computed, not stored: what shapes it is what it holds.
+    json["grid"] = ocean->gridSize();
+    json["patchSize"] = ocean->patchSize();
+    json["windSpeed"] = ocean->windSpeed();
+    json["windDirection"] = ocean->windDirection();
+    json["amplitude"] = ocean->amplitude();
+    json["choppiness"] = ocean->choppiness();
+    json["seed"] = ocean->seed();
+    return;
+  }
+  if (const auto* card = dynamic_cast<const AnimatedCard*>(&layer)) {
+    json["source"] = card->imagePath();
+    json["frames"] = card->nFrames();
+    json["fps"] = card->FPS();
+    json["width"] = card->imageWidth();
+    json["height"] = card->imageHeight();
+    if (!card->sourceError().empty()) {
+      json["error"] = card->sourceError();
+    }
+    return;
+  }
   if (const auto* points = dynamic_cast<const PointLayer*>(&layer)) {
     json["points"] = points->nPoints();
     json["linked"] = points->fileStoredAsLink();
@@ -149,7 +173,21 @@ void appendLayerText(std::string& text, const Layer& layer, std::vector<const La
   const std::string indent(2 * (ancestors.size() + 1), ' ');
   text += fmt::format("{}{} \"{}\"{}", indent, layer.className(), layer.name(),
                       layer.isVisible() ? "" : " (hidden)");
-  if (const auto* points = dynamic_cast<const PointLayer*>(&layer)) {
+  if (const auto* ocean = dynamic_cast<const OceanFFT*>(&layer)) {
+    text += fmt::format(
+        ", {0} × {0} grid over {1:g} units, wind {2:g} m/s at {3:g}°, amplitude {4:g}, "
+        "choppiness {5:g}, seed {6}",
+        ocean->gridSize(), ocean->patchSize(), ocean->windSpeed(), ocean->windDirection(),
+        ocean->amplitude(), ocean->choppiness(), ocean->seed());
+  } else if (const auto* card = dynamic_cast<const AnimatedCard*>(&layer)) {
+    if (card->hasImages()) {
+      text += fmt::format(", {} from {} ({} × {}) at {} fps", frames(card->nFrames()),
+                          card->imagePath(), card->imageWidth(), card->imageHeight(), card->FPS());
+    } else {
+      text += card->imagePath().empty() ? std::string(", no pictures")
+                                        : ", no pictures: " + card->sourceError();
+    }
+  } else if (const auto* points = dynamic_cast<const PointLayer*>(&layer)) {
     text +=
         ", " + plural(static_cast<std::size_t>(std::max(points->nPoints(), 0)), "point", "points");
     if (points->fileStoredAsLink()) {

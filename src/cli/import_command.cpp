@@ -22,8 +22,12 @@
 #include "cli/point_cloud_summary.h"
 #include "cli/standard_error_capture.h"
 #include "platform/file_location.h"
+#include "scene/animated_card.h"
 #include "scene/my_document.h"
+#include "scene/ocean_fft.h"
 #include "scene/point_layer.h"
+#include "timeline/timeline_editing.h"
+#include "timeline/timeline_track.h"
 
 namespace cloudreel::cli {
 
@@ -101,6 +105,20 @@ std::optional<Imported> importCameraPath(const std::filesystem::path& path, Erro
   return Imported{cameraPath, cameraPath};
 }
 
+// A card of the picture, folder or pattern; a source that gives no
+// picture is refused with the reason.
+std::optional<Imported> importCard(const std::string& source, Error* error) {
+  auto card = std::make_shared<AnimatedCard>();
+  // Relative to where the command runs, as the other files are.
+  card->setImagePath(absolutePath(source).string());
+  if (!card->hasImages()) {
+    fail(error, card->sourceError());
+    return std::nullopt;
+  }
+  card->setName(std::filesystem::path(source).stem().string());
+  return Imported{card, nullptr};
+}
+
 // The union of the layers' boxes. A box counts when its numbers are finite,
 // each minimum at most its maximum, and it has some extent: layers that
 // have no box (camera paths) keep the all-zero one they were made with.
@@ -136,9 +154,15 @@ CLI::App* addImportCommand(CLI::App& app, ImportOptions& options) {
   command->add_option("--zxy-path", options.zxyPaths,
                       "a camera path file of positions and angles (a frame count, then x y z "
                       "and three angles in degrees a frame)");
+  command->add_option("--card", options.cards,
+                      "a picture card: a picture file, a folder of numbered pictures, or a "
+                      "printf-style pattern such as shots/frame_%04d.png");
+  command->add_flag("--ocean", options.ocean,
+                    "add an ocean surface whose waves move with the timeline");
   command->footer(
       "Layers are added in the order: the FILEs, then the --matrix-path files, then the "
-      "--zxy-path files. A bundle file's layer holds its cameras as a child, which also joins "
+      "--zxy-path files, the --card pictures and the ocean. A bundle file's layer holds its "
+      "cameras as a child, which also joins "
       "the document's camera paths, as does every camera path file. A new document's scene "
       "camera is placed to see the imported points whole; an existing document keeps its "
       "camera. When any file cannot be imported nothing is saved.");
@@ -151,8 +175,9 @@ int runImportCommand(const ImportOptions& options) {
     reportFailure(fmt::format("{}: import writes .reel documents", documentPath.string()));
     return 1;
   }
-  if (options.files.empty() && options.matrixPaths.empty() && options.zxyPaths.empty()) {
-    reportFailure("import: nothing to import (name point files or camera paths)");
+  if (options.files.empty() && options.matrixPaths.empty() && options.zxyPaths.empty() &&
+      options.cards.empty() && !options.ocean) {
+    reportFailure("import: nothing to import (name point files, camera paths, cards or --ocean)");
     return 1;
   }
   prepareForDocuments();
@@ -201,6 +226,19 @@ int runImportCommand(const ImportOptions& options) {
     imported.push_back(std::move(*next));
   }
 
+  for (const std::string& source : options.cards) {
+    if (!(next = importCard(source, &error))) {
+      reportFailure(error.message);
+      return 1;
+    }
+    imported.push_back(std::move(*next));
+  }
+  std::shared_ptr<OceanFFT> ocean;
+  if (options.ocean) {
+    ocean = std::make_shared<OceanFFT>();
+    imported.push_back({ocean, nullptr});
+  }
+
   if (!exists && document.sceneCamera()) {
     if (const auto box = unionOfBoxes(imported)) {
       frameBoxWithCamera(*document.sceneCamera(), *box);
@@ -211,6 +249,10 @@ int runImportCommand(const ImportOptions& options) {
     if (item.cameraPath) {
       document.addCameraPath(item.cameraPath);
     }
+  }
+  if (ocean) {
+    // Its waves follow the timeline, as in the application.
+    addTrackToDocument(document, std::make_shared<TimelineTrack>(ocean, "frame", "Time"));
   }
   if (!writeDocument(document, documentPath, &error)) {
     reportFailure(error.message);

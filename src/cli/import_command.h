@@ -1,8 +1,9 @@
 #pragma once
 // `cloudreel import DOC.reel FILE... [--link] [--downsample N]
-// [--matrix-path FILE]... [--zxy-path FILE]...`: adds a layer for each
-// point file and camera path file to a document, making the document when
-// it does not exist yet, and saves it.
+// [--matrix-path FILE]... [--zxy-path FILE]... [--card PATH_OR_PATTERN]...
+// [--ocean]`: adds a layer for each point file, camera path file and
+// picture card, and an ocean, to a document, making the document when it
+// does not exist yet, and saves it.
 
 #include <cstdint>
 #include <string>
@@ -19,6 +20,8 @@ struct ImportOptions {
   std::vector<std::string> files;
   std::vector<std::string> matrixPaths;
   std::vector<std::string> zxyPaths;
+  std::vector<std::string> cards;
+  bool ocean = false;
   bool link = false;
   std::int32_t downsample = 1;
 };

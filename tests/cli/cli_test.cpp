@@ -373,6 +373,55 @@ TEST(CliImport, MakesADocumentOfEveryKindOfInputThatInfoDescribes) {
   EXPECT_EQ(appended["sceneCamera"], info["sceneCamera"]);
 }
 
+TEST(CliImport, AddsPictureCardsAndAnOceanThatInfoListsAndRenderShows) {
+  TempDir dir;
+  fs::create_directory(dir / "shots");
+  // Three 8 × 4 pictures, numbers 1, 2 and 4: number 3 is missing.
+  for (int n : {1, 2, 4}) {
+    const std::vector<std::uint8_t> rgb(8 * 4 * 3, static_cast<std::uint8_t>(60 * n));
+    const std::string name = "shots/shot_" + std::to_string(n) + ".png";
+    ASSERT_NE(stbi_write_png((dir / name).c_str(), 8, 4, 3, rgb.data(), 8 * 3), 0);
+  }
+  const Outcome run = cloudreel(
+      dir, {"import", "sea.reel", "--card", "shots/shot_%d.png", "--card", "shots", "--ocean"});
+  ASSERT_EQ(run.status, 0) << run.err;
+
+  const nlohmann::json info = infoJson(dir, "sea.reel");
+  const nlohmann::json& layers = info["layers"];
+  EXPECT_EQ(strings(layers, "class"),
+            (std::vector<std::string>{"AnimatedCard", "AnimatedCard", "OceanFFT"}));
+  EXPECT_EQ(layers[0]["frames"], 4);  // 1 to 4, the missing one keeps its place
+  EXPECT_EQ(layers[0]["source"], (fs::canonical(dir.path()) / "shots/shot_%d.png").string());
+  EXPECT_EQ(layers[1]["frames"], 3);  // a folder: the pictures it holds
+  EXPECT_EQ(layers[1]["width"], 8);
+  EXPECT_EQ(layers[2]["grid"], 128);
+  // The ocean's time follows the timeline.
+  EXPECT_EQ(info["timeline"]["tracks"].back()["class"], "TimelineTrack");
+  const Outcome text = cloudreel(dir, {"info", "sea.reel"});
+  EXPECT_NE(text.out.find("OceanFFT \"Ocean\", 128 × 128 grid over 50 units, wind 8 m/s"),
+            std::string::npos)
+      << text.out;
+  EXPECT_NE(text.out.find("AnimatedCard \"shots\", 3 frames from "), std::string::npos)
+      << text.out;
+
+  // The waves move between two frames a second apart.
+  ASSERT_EQ(cloudreel(dir, {"render", "sea.reel", "--out", "f", "--size", "96x72", "--frames",
+                            "0-0", "--pattern", "a_%d.tif"})
+                .status,
+            0);
+  ASSERT_EQ(cloudreel(dir, {"render", "sea.reel", "--out", "f", "--size", "96x72", "--frames",
+                            "25-25", "--pattern", "b_%d.tif"})
+                .status,
+            0);
+  EXPECT_NE(readFile(dir / "f/a_0.tif"), readFile(dir / "f/b_25.tif"));
+
+  // A card source that names no picture is refused, naming it.
+  const Outcome refused = cloudreel(dir, {"import", "none.reel", "--card", "nothing_%03d.png"});
+  EXPECT_NE(refused.status, 0);
+  EXPECT_NE(refused.err.find("nothing_%03d.png"), std::string::npos) << refused.err;
+  EXPECT_FALSE(fs::exists(dir / "none.reel"));
+}
+
 TEST(CliImport, LinkedLayersAreReadFromTheirFilesAndAMissingOneIsNamed) {
   TempDir dir;
   writeSceneInputs(dir);

@@ -187,7 +187,7 @@ TEST(CliDemo, MakesADocumentThatAnimatesTheReconstruction) {
   const Outcome run = cloudreel(dir, {"demo", "demo", "--no-render", "--points", "5000"});
   ASSERT_EQ(run.status, 0) << run.err;
   const nlohmann::json info = infoJson(dir, "demo/demo.reel");
-  ASSERT_EQ(info["layers"].size(), 4u) << info.dump(2);
+  ASSERT_EQ(info["layers"].size(), 6u) << info.dump(2);
 
   // The reconstruction, read again from its file on opening.
   const auto& bundle = info["layers"][0];
@@ -202,6 +202,15 @@ TEST(CliDemo, MakesADocumentThatAnimatesTheReconstruction) {
   EXPECT_EQ(info["layers"][1]["class"], "DiscreteCameraPath");
   EXPECT_EQ(info["layers"][2]["class"], "Sphere");
   EXPECT_EQ(info["layers"][3]["class"], "Point3D");
+  // An ocean below the scene, and a card showing the first photograph.
+  EXPECT_EQ(info["layers"][4]["class"], "OceanFFT");
+  EXPECT_EQ(info["layers"][4]["grid"], 128);
+  const auto& card = info["layers"][5];
+  EXPECT_EQ(card["class"], "AnimatedCard");
+  EXPECT_EQ(fs::path(card["source"].get<std::string>()).parent_path(),
+            fs::canonical(dir / "demo/images"));
+  EXPECT_EQ(card["frames"], 1);
+  EXPECT_EQ(card["width"], 320);
   std::vector<std::string> paths;
   for (const auto& path : info["cameraPaths"]) {
     paths.push_back(path["class"].get<std::string>() + " " + path["name"].get<std::string>());
@@ -209,7 +218,8 @@ TEST(CliDemo, MakesADocumentThatAnimatesTheReconstruction) {
   EXPECT_EQ(paths, (std::vector<std::string>{"CameraField Cameras", "DiscreteCameraPath Flight"}));
 
   // The flight and the two ramps (point size and bucket limit; a track's
-  // title is not stored), each a span between two control points.
+  // title is not stored), each a span between two control points, and the
+  // ocean's time over the flight.
   const auto& timeline = info["timeline"];
   EXPECT_EQ(timeline["fps"], 25);
   EXPECT_EQ(timeline["lengthFrames"], 60);
@@ -219,7 +229,8 @@ TEST(CliDemo, MakesADocumentThatAnimatesTheReconstruction) {
                      std::to_string(track["clips"].get<int>()));
   }
   EXPECT_EQ(tracks, (std::vector<std::string>{"TimecodeTrack 0", "AffineTrack 3",
-                                              "FloatValueTrack 3", "FloatValueTrack 3"}));
+                                              "FloatValueTrack 3", "FloatValueTrack 3",
+                                              "TimelineTrack 1"}));
   // The flight ends where the scene camera rests.
   EXPECT_EQ(info["sceneCamera"]["position"], nlohmann::json({0.0, 0.0, 0.0}));
 }
