@@ -24,15 +24,12 @@ namespace cloudreel {
 
 namespace {
 
-struct UndoableKey {
-  std::string_view key;
-  std::string_view actionName;
-};
-constexpr UndoableKey kUndoableKeys[] = {{"imagePath", "Change Picture"},
-                                         {"cardHeight", "Change Size"},
-                                         {"opacity", "Change Opacity"},
-                                         {"frameOffset", "Change Frame Offset"},
-                                         {"FPS", "Change Frame Rate"}};
+// The keys the document observes for undo, with the undo steps' names.
+constexpr Layer::UndoableKey kUndoableKeys[] = {{"imagePath", "Change Picture"},
+                                                {"cardHeight", "Change Size"},
+                                                {"opacity", "Change Opacity"},
+                                                {"frameOffset", "Change Frame Offset"},
+                                                {"FPS", "Change Frame Rate"}};
 
 float finiteOr(float v, float fallback) { return std::isfinite(v) ? v : fallback; }
 
@@ -79,7 +76,7 @@ AnimatedCard::AnimatedCard()
 }
 
 AnimatedCard::~AnimatedCard() {
-  // The workers stop before the textures and the sequence go.
+  // The workers stop before the textures go.
   decoder_.reset();
 }
 
@@ -125,7 +122,6 @@ void AnimatedCard::setImagePath(std::string path) {
 
 void AnimatedCard::findSequence() {
   decoder_.reset();
-  sequence_.reset();
   textures_->textures.clear();
   lastShown_ = -1;
   missingFiles_.clear();
@@ -155,7 +151,6 @@ void AnimatedCard::findSequence() {
       break;
     }
   }
-  sequence_ = std::make_unique<ImageSequence>(*sequence);
   decoder_ = std::make_unique<ImageSequenceDecoder>(std::move(*sequence), kDecodeBudget);
   // A picture decoded while the view is idle should show without waiting
   // for the next unrelated redraw. The workers only flag and post; the
@@ -175,7 +170,7 @@ void AnimatedCard::findSequence() {
       }
     });
   });
-  setNFrames(sequence_->frameCount());
+  setNFrames(decoder_->sequence().frameCount());
 }
 
 float AnimatedCard::aspect() const {
@@ -197,18 +192,19 @@ void AnimatedCard::setFrame(float v) { changeValueForKey("frame", frame_, finite
 void AnimatedCard::setFrameForTime(float seconds) { setFrame(seconds * static_cast<float>(FPS())); }
 
 int AnimatedCard::pictureIndex() const {
-  if (!sequence_) {
+  if (!decoder_) {
     return 0;
   }
   // In 64 bits and clamped, so no frame or offset can overflow.
   const double whole = std::floor(static_cast<double>(frame_));
   const auto frame = static_cast<std::int64_t>(std::clamp(whole, -1e12, 1e12));
   const std::int64_t picture = frame + frameOffset_;
-  return static_cast<int>(std::clamp<std::int64_t>(picture, 0, sequence_->frameCount() - 1));
+  return static_cast<int>(
+      std::clamp<std::int64_t>(picture, 0, decoder_->sequence().frameCount() - 1));
 }
 
 std::filesystem::path AnimatedCard::pictureFile() const {
-  return sequence_ ? sequence_->fileForFrame(pictureIndex()) : std::filesystem::path();
+  return decoder_ ? decoder_->sequence().fileForFrame(pictureIndex()) : std::filesystem::path();
 }
 
 int AnimatedCard::picturesDecoded() const { return decoder_ ? decoder_->framesHeld() : 0; }
@@ -234,7 +230,7 @@ const AnimatedCard::Texture* AnimatedCard::cachedTexture(int picture) {
 
 const AnimatedCard::Texture* AnimatedCard::textureForDrawing(bool wait) {
   gl::GLContext* context = gl::GLContext::current();
-  if (!decoder_ || !sequence_ || context == nullptr) {
+  if (!decoder_ || context == nullptr) {
     return nullptr;
   }
   const int picture = pictureIndex();
@@ -279,7 +275,7 @@ const AnimatedCard::Texture* AnimatedCard::textureForDrawing(bool wait) {
     return &textures_->textures.front();
   }
   if (frame.state == ImageSequenceDecoder::State::Failed) {
-    const std::filesystem::path file = sequence_->fileForFrame(picture);
+    const std::filesystem::path file = decoder_->sequence().fileForFrame(picture);
     if (missingFiles_.insert(file).second) {
       logWarningf("card \"%s\": %s; showing the last good picture", name(), frame.error);
     }
@@ -350,19 +346,11 @@ void AnimatedCard::getAnimatablePropsInArray(std::vector<std::shared_ptr<Timelin
 
 void AnimatedCard::addObserversForDocument(MyDocument* document) {
   AnimatedLayer::addObserversForDocument(document);
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      addObserver(*document, std::string(k.key), ObservingOptions::Old, std::string(k.actionName));
-    }
-  }
+  addUndoObservers(document, kUndoableKeys);
 }
 
 void AnimatedCard::removeObserversForDocument(MyDocument* document) {
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      removeObserver(*document, k.key);
-    }
-  }
+  removeUndoObservers(document, kUndoableKeys);
   AnimatedLayer::removeObserversForDocument(document);
 }
 

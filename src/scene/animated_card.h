@@ -29,7 +29,6 @@
 
 namespace cloudreel {
 
-class ImageSequence;
 class ImageSequenceDecoder;
 
 class AnimatedCard : public AnimatedLayer {
@@ -54,7 +53,7 @@ class AnimatedCard : public AnimatedLayer {
   void setImagePath(std::string path);
   // Why the source gives no pictures; empty when it does (or is empty).
   const std::string& sourceError() const { return sourceError_; }
-  bool hasImages() const { return sequence_ != nullptr; }
+  bool hasImages() const { return decoder_ != nullptr; }
   // The first picture's size in pixels; 0 × 0 without pictures.
   int imageWidth() const { return imageWidth_; }
   int imageHeight() const { return imageHeight_; }
@@ -128,7 +127,6 @@ class AnimatedCard : public AnimatedLayer {
   float frame_ = 0.0f;
   int imageWidth_ = 0;
   int imageHeight_ = 0;
-  std::unique_ptr<ImageSequence> sequence_;
   std::unique_ptr<ImageSequenceDecoder> decoder_;
   std::unique_ptr<TextureCache> textures_;
   // The picture shown last; its texture is kept while later ones decode.

@@ -108,6 +108,22 @@ void Layer::removeObserversForDocument(MyDocument* document) {
   }
 }
 
+void Layer::addUndoObservers(MyDocument* document, std::span<const UndoableKey> keys) {
+  if (document != nullptr) {
+    for (const UndoableKey& k : keys) {
+      addObserver(*document, std::string(k.key), ObservingOptions::Old, std::string(k.actionName));
+    }
+  }
+}
+
+void Layer::removeUndoObservers(MyDocument* document, std::span<const UndoableKey> keys) {
+  if (document != nullptr) {
+    for (const UndoableKey& k : keys) {
+      removeObserver(*document, k.key);
+    }
+  }
+}
+
 void Layer::drawContentWithOptions(const RenderOptions& options) {
   glPushMatrix();
   if (isInWorld_) {
@@ -239,8 +255,7 @@ const PropertyTable& AnimatedLayer::properties() const {
   return table;
 }
 
-void AnimatedLayer::getAnimatablePropsInArray(
-    std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
+void AnimatedLayer::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack>>& tracks) {
   Layer::getAnimatablePropsInArray(tracks);
   tracks.push_back(std::make_shared<TimelineTrack>(weak_from_this().lock(), "frame", "Time"));
 }

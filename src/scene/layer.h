@@ -7,6 +7,7 @@
 
 #include <array>
 #include <memory>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -28,6 +29,12 @@ class Layer : public Animatable3DObject {
   using BoundingBox = std::array<double, 6>;
 
   Layer() = default;
+
+  // A key the document observes for undo, and the undo step's name.
+  struct UndoableKey {
+    std::string_view key;
+    std::string_view actionName;
+  };
 
   std::string_view className() const override { return "Layer"; }
   const PropertyTable& properties() const override;
@@ -125,6 +132,10 @@ class Layer : public Animatable3DObject {
  protected:
   std::shared_ptr<Animatable3DObject> makeBlank() const override;
   void copyInto(Animatable3DObject& target) const override;
+
+  // For the layer kinds' own undoable keys; a null document does nothing.
+  void addUndoObservers(MyDocument* document, std::span<const UndoableKey> keys);
+  void removeUndoObservers(MyDocument* document, std::span<const UndoableKey> keys);
 
  private:
   std::string name_;

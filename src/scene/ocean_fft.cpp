@@ -18,19 +18,16 @@ namespace cloudreel {
 
 namespace {
 
-struct UndoableKey {
-  std::string_view key;
-  std::string_view actionName;
-};
-constexpr UndoableKey kUndoableKeys[] = {{"gridSize", "Change Grid Size"},
-                                         {"patchSize", "Change Patch Size"},
-                                         {"windSpeed", "Change Wind Speed"},
-                                         {"windDirection", "Change Wind Direction"},
-                                         {"amplitude", "Change Amplitude"},
-                                         {"choppiness", "Change Choppiness"},
-                                         {"seed", "Change Seed"},
-                                         {"fixedColor", "Change Colour"},
-                                         {"drawWireFrame", "Wireframe"}};
+// The keys the document observes for undo, with the undo steps' names.
+constexpr Layer::UndoableKey kUndoableKeys[] = {{"gridSize", "Change Grid Size"},
+                                                {"patchSize", "Change Patch Size"},
+                                                {"windSpeed", "Change Wind Speed"},
+                                                {"windDirection", "Change Wind Direction"},
+                                                {"amplitude", "Change Amplitude"},
+                                                {"choppiness", "Change Choppiness"},
+                                                {"seed", "Change Seed"},
+                                                {"fixedColor", "Change Colour"},
+                                                {"drawWireFrame", "Wireframe"}};
 
 // A finite value at zero or above; anything else (negative, NaN, infinite)
 // becomes `fallback`.
@@ -94,45 +91,27 @@ void OceanFFT::copyInto(Animatable3DObject& target) const {
 // --- parameters
 
 void OceanFFT::setGridSize(std::int32_t v) {
-  willChangeValueForKey("gridSize");
-  parameters_.gridSize = OceanSpectrum::clampedGridSize(v);
-  parametersChanged();
-  didChangeValueForKey("gridSize");
+  changeParameter("gridSize", parameters_.gridSize, OceanSpectrum::clampedGridSize(v));
 }
 
 void OceanFFT::setPatchSize(float v) {
-  willChangeValueForKey("patchSize");
-  parameters_.patchSize = nonNegativeFinite(v, 0.0f);
-  parametersChanged();
-  didChangeValueForKey("patchSize");
+  changeParameter("patchSize", parameters_.patchSize, nonNegativeFinite(v, 0.0f));
 }
 
 void OceanFFT::setWindSpeed(float v) {
-  willChangeValueForKey("windSpeed");
-  parameters_.windSpeed = nonNegativeFinite(v, 0.0f);
-  parametersChanged();
-  didChangeValueForKey("windSpeed");
+  changeParameter("windSpeed", parameters_.windSpeed, nonNegativeFinite(v, 0.0f));
 }
 
 void OceanFFT::setWindDirection(float v) {
-  willChangeValueForKey("windDirection");
-  parameters_.windDirection = finiteOr(v, 0.0f);
-  parametersChanged();
-  didChangeValueForKey("windDirection");
+  changeParameter("windDirection", parameters_.windDirection, finiteOr(v, 0.0f));
 }
 
 void OceanFFT::setAmplitude(float v) {
-  willChangeValueForKey("amplitude");
-  parameters_.amplitude = nonNegativeFinite(v, 0.0f);
-  parametersChanged();
-  didChangeValueForKey("amplitude");
+  changeParameter("amplitude", parameters_.amplitude, nonNegativeFinite(v, 0.0f));
 }
 
 void OceanFFT::setSeed(std::int32_t v) {
-  willChangeValueForKey("seed");
-  parameters_.seed = static_cast<std::uint32_t>(v);
-  parametersChanged();
-  didChangeValueForKey("seed");
+  changeParameter("seed", parameters_.seed, static_cast<std::uint32_t>(v));
 }
 
 void OceanFFT::setChoppiness(float v) {
@@ -276,19 +255,11 @@ void OceanFFT::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTra
 
 void OceanFFT::addObserversForDocument(MyDocument* document) {
   PointLayer::addObserversForDocument(document);
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      addObserver(*document, std::string(k.key), ObservingOptions::Old, std::string(k.actionName));
-    }
-  }
+  addUndoObservers(document, kUndoableKeys);
 }
 
 void OceanFFT::removeObserversForDocument(MyDocument* document) {
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      removeObserver(*document, k.key);
-    }
-  }
+  removeUndoObservers(document, kUndoableKeys);
   PointLayer::removeObserversForDocument(document);
 }
 

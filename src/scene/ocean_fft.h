@@ -97,7 +97,13 @@ class OceanFFT : public PointLayer {
   void copyInto(Animatable3DObject& target) const override;
 
  private:
-  void parametersChanged() { spectrumIsStale_ = true; }
+  // Stores a wave parameter, telling its observers; the spectrum is made
+  // again at the next update.
+  template <typename T>
+  void changeParameter(std::string_view key, T& field, T value) {
+    changeValueForKey(key, field, value);
+    spectrumIsStale_ = true;
+  }
   void colourRecords();
 
   OceanParameters parameters_;

@@ -17,15 +17,11 @@ namespace {
 
 std::shared_ptr<Color> white() { return Color::colorWithRGBA(1.0f, 1.0f, 1.0f, 1.0f); }
 
-// The undo action names of the properties the document observes.
-struct UndoableKey {
-  std::string_view key;
-  std::string_view actionName;
-};
-constexpr UndoableKey kUndoableKeys[] = {{"shape", "Change Shape"},
-                                         {"size", "Change Size"},
-                                         {"segments", "Change Segments"},
-                                         {"color", "Change Colour"}};
+// The keys the document observes for undo, with the undo steps' names.
+constexpr Layer::UndoableKey kUndoableKeys[] = {{"shape", "Change Shape"},
+                                                {"size", "Change Size"},
+                                                {"segments", "Change Segments"},
+                                                {"color", "Change Colour"}};
 
 void drawPlane(double size) {
   const double h = size * 0.5;
@@ -120,19 +116,11 @@ void Sphere::getAnimatablePropsInArray(std::vector<std::shared_ptr<TimelineTrack
 
 void Sphere::addObserversForDocument(MyDocument* document) {
   Layer::addObserversForDocument(document);
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      addObserver(*document, std::string(k.key), ObservingOptions::Old, std::string(k.actionName));
-    }
-  }
+  addUndoObservers(document, kUndoableKeys);
 }
 
 void Sphere::removeObserversForDocument(MyDocument* document) {
-  if (document != nullptr) {
-    for (const UndoableKey& k : kUndoableKeys) {
-      removeObserver(*document, k.key);
-    }
-  }
+  removeUndoObservers(document, kUndoableKeys);
   Layer::removeObserversForDocument(document);
 }
 
