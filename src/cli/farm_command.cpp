@@ -195,6 +195,9 @@ std::vector<std::string> renderArguments(const RenderCommandOptions& render) {
     args.insert(args.end(), {"--stereo", fmt::format("{}", *render.stereoSeparation)});
   }
   args.insert(args.end(), {"--pattern", render.pattern});
+  if (render.rasterizer != "auto") {
+    args.insert(args.end(), {"--rasterizer", render.rasterizer});
+  }
   if (!render.cameraPath.empty()) {
     args.insert(args.end(), {"--camera-path", render.cameraPath});
   }

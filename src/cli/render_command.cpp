@@ -127,6 +127,8 @@ int renderDocument(MyDocument& document, const RenderCommandOptions& options) {
   renderer->setOutputPattern(plan->pattern);
   renderer->setIsStereoRender(options.stereoSeparation.has_value());
   renderer->setStereoSeparation(options.stereoSeparation.value_or(0.0f));
+  renderer->setPointRasterization(
+      pointRasterizationNamed(options.rasterizer).value_or(PointRasterization::Auto));
   OfflineGLRenderer& frames = *renderer;
 
   RenderProgressLine progress(RenderProgressLine::styleNamed(options.progress), range.frameCount());

@@ -42,6 +42,8 @@ struct RenderCommandOptions {
   std::string cameraPath;  // a name or an index; empty for the timeline
   bool skipExisting = false;
   std::string progress = "auto";
+  // Where plain points are placed: "auto", "gl" or "cpu".
+  std::string rasterizer = "auto";
 };
 
 // Adds the subcommand, which fills `options` when parsed.

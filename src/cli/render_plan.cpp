@@ -7,6 +7,7 @@
 #include <cmath>
 
 #include "camera/camera_path.h"
+#include "render/cpu_point_pass.h"
 #include "render/render_properties_controller.h"
 #include "scene/my_document.h"
 #include "timeline/timeline.h"
@@ -98,6 +99,10 @@ std::optional<RenderPlan> planRender(const MyDocument& document,
     return std::nullopt;
   }
   plan.pattern = *pattern;
+  if (!pointRasterizationNamed(options.rasterizer)) {
+    why = "--rasterizer takes auto, gl or cpu, not " + options.rasterizer;
+    return std::nullopt;
+  }
   if (options.stereoSeparation && !std::isfinite(*options.stereoSeparation)) {
     why = "The stereo separation must be a number";
     return std::nullopt;
@@ -165,6 +170,12 @@ void addRenderOptions(CLI::App& command, RenderCommandOptions& options) {
   command.add_option("--camera-path", options.cameraPath,
                      "render through a camera path's frames instead of the timeline: its name, "
                      "or its index from 0 as `cloudreel info` lists cameraPaths");
+  command
+      .add_option("--rasterizer", options.rasterizer,
+                  "where plain points are drawn: gl (through OpenGL), cpu (on every core, "
+                  "into the frame OpenGL drew), or auto (cpu where OpenGL is a software "
+                  "rasteriser, gl on a GPU); the frames are the same")
+      ->capture_default_str();
   command.add_flag("--skip-existing", options.skipExisting,
                    "leave frames whose files are all there (to resume a stopped render)");
 }

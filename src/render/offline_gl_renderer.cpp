@@ -93,6 +93,8 @@ std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExport
     setError(error, failure.domain, failure.code, failure.message);
     return nullptr;
   }
+  renderer->softwareGL_ = currentContextIsSoftware();
+  renderer->cpuPassSupported_ = CpuPointPass::supportedByCurrentContext();
   glEnable(GL_BLEND);
   glBlendFunc(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA);
   glEnable(GL_DEPTH_TEST);
@@ -117,6 +119,18 @@ std::unique_ptr<OfflineGLRenderer> OfflineGLRenderer::initWithSceneContextExport
     return nullptr;
   }
   return renderer;
+}
+
+bool OfflineGLRenderer::drawsPointsOnCpu() const {
+  switch (pointRasterization_) {
+    case PointRasterization::OpenGL:
+      return false;
+    case PointRasterization::Auto:
+      return softwareGL_ && cpuPassSupported_;
+    case PointRasterization::Cpu:
+      break;
+  }
+  return cpuPassSupported_;
 }
 
 std::vector<std::filesystem::path> OfflineGLRenderer::pathsForFrame(int frame) const {
@@ -160,6 +174,10 @@ OfflineGLRenderer::DrawnFrame OfflineGLRenderer::drawFrameOfDocumentForCamera(
   const auto drawColour = [&](float offset, const std::filesystem::path& path) {
     scene_.setupFrustumForCamera(*camera, offset);
     renderColorFrameOfDocumentForCamera(document, camera);
+    if (pointPass_ && pointPass_->failure() && !drawn.failed) {
+      drawn.failed = true;
+      drawn.error = *pointPass_->failure();
+    }
     DrawnFrame::ColourFile file{path, spareColourImage()};
     if (!readColorFrame(file.image, &failure) && !drawn.failed) {
       drawn.failed = true;
@@ -249,7 +267,27 @@ void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document
   glClear(GL_COLOR_BUFFER_BIT | GL_DEPTH_BUFFER_BIT);
   setUpLighting();
   renderOptions_.setSceneCamera(camera);
+  CpuPointPass* pass = nullptr;
+  if (pointRasterization_ == PointRasterization::Cpu && !cpuPassSupported_ && !warnedNoCpuPass_) {
+    logWarningf(
+        "This OpenGL cannot take frames drawn on the CPU back (it needs OpenGL 3.0); "
+        "points are drawn through OpenGL");
+    warnedNoCpuPass_ = true;
+  }
+  if (framebuffer_ && drawsPointsOnCpu()) {
+    if (!pointPass_) {
+      pointPass_ = std::make_unique<CpuPointPass>();
+    }
+    pass = pointPass_.get();
+    pass->beginFrame(framebuffer_->width(), framebuffer_->height(), framebuffer_->depthBits());
+  }
+  renderOptions_.setCpuPointPass(pass);
   document.drawContentWithOptions(renderOptions_);
+  if (pass != nullptr) {
+    // The points of the last layers.
+    pass->flush();
+    renderOptions_.setCpuPointPass(nullptr);
+  }
   glFinish();
   if (const GLenum glError = glGetError(); glError != GL_NO_ERROR) {
     // The frame is still saved.

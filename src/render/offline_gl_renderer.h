@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "platform/error.h"
+#include "render/cpu_point_pass.h"
 #include "render/frame_pattern.h"
 #include "render/gl/framebuffer.h"
 #include "render/gl/gl_context.h"
@@ -115,6 +116,16 @@ class OfflineGLRenderer {
   void setIsStereoRender(bool v) { isStereoRender_ = v; }
   float stereoSeparation() const { return stereoSeparation_; }
   void setStereoSeparation(float v) { stereoSeparation_ = v; }
+  // Where plain points are placed (Auto unless set): see CpuPointPass.
+  PointRasterization pointRasterization() const { return pointRasterization_; }
+  void setPointRasterization(PointRasterization v) { pointRasterization_ = v; }
+  // Whether frames place plain points on the CPU, as the setting resolves
+  // on this renderer's OpenGL. "cpu" falls back to OpenGL, with a warning,
+  // where the context cannot write a frame back.
+  bool drawsPointsOnCpu() const;
+  // Records the last colour frame handed to the CPU pass (0 when it drew
+  // all its points through OpenGL).
+  std::size_t pointsDrawnOnCpu() const { return pointPass_ ? pointPass_->pointsThisFrame() : 0; }
 
  private:
   OfflineGLRenderer(const OpenGLScene& scene, std::unique_ptr<gl::GLContext> context,
@@ -131,6 +142,12 @@ class OfflineGLRenderer {
   bool isDepthRender_ = false;
   bool isStereoRender_ = false;
   float stereoSeparation_ = 0.0f;
+  PointRasterization pointRasterization_ = PointRasterization::Auto;
+  // Read off the context when the renderer is made.
+  bool softwareGL_ = false;
+  bool cpuPassSupported_ = false;
+  bool warnedNoCpuPass_ = false;
+  std::unique_ptr<CpuPointPass> pointPass_;
   // Read-back images of written frames, kept so that a render allocates its
   // images once (two frames' worth when writing overlaps drawing).
   std::mutex spareMutex_;

@@ -7,11 +7,13 @@
 #include <epoxy/gl.h>
 
 #include <algorithm>
+#include <cmath>
 #include <cstring>
 #include <limits>
 
 #include "platform/log.h"
 #include "platform/value.h"
+#include "render/cpu_point_pass.h"
 #include "render/gl/shapes.h"
 #include "render/render_options.h"
 #include "scene/point_layer.h"
@@ -224,6 +226,13 @@ void PointLayer::drawGLWithOptions(const RenderOptions& options) {
     invalidateOpenGLDisplayLists();
     cache.points = std::move(keep);
   }
+  if (CpuPointPass* pass = options.cpuPointPass(); pass != nullptr) {
+    if (drawPointsOnCpu(*pass, threshold)) {
+      return;
+    }
+    // What the pass holds is drawn before these points go through OpenGL.
+    pass->flush();
+  }
   if (antialias_) {
     glEnable(GL_POINT_SMOOTH);
   }
@@ -261,6 +270,21 @@ void PointLayer::buildDrawing(std::int32_t threshold) {
     cache.list.compileAndExecute([this] { emitMesh(); });
     return;
   }
+  recordPointsState(threshold);
+  const LuckOrderedPoints::Source source{points_.get(),         pointsGeneration_, points(),
+                                         drawableRecordCount(), hasNormals_,       opacity_};
+  if (!cache.points.holds(source)) {
+    (void)cache.points.upload(source);
+  }
+  replayDrawing();
+}
+
+void PointLayer::recordPointsState(std::int32_t threshold) {
+  PointDrawingCache& cache = drawingCache();
+  listUsesDrawMode_ = drawMode_;
+  listUsesColorMode_ = colorMode_;
+  displayListBuckets_ = threshold;
+  cache.threshold = threshold;
   cache.kind = PointDrawingCache::Kind::Points;
   cache.pointSize = pointSize_;
   cache.attenuation = attenuatePoints_ ? std::array<float, 3>{atten_a_, atten_b_, atten_c_}
@@ -268,12 +292,48 @@ void PointLayer::buildDrawing(std::int32_t threshold) {
   cache.colorMode = colorMode_;
   cache.fixedColor = {fixedColor_->red(), fixedColor_->green(), fixedColor_->blue()};
   cache.withNormals = hasNormals_;
-  const LuckOrderedPoints::Source source{points_.get(),         pointsGeneration_, points(),
-                                         drawableRecordCount(), hasNormals_,       opacity_};
-  if (!cache.points.holds(source)) {
-    (void)cache.points.upload(source);
+  cache.opacity = opacity_;
+}
+
+bool PointLayer::drawPointsOnCpu(CpuPointPass& pass, std::int32_t threshold) {
+  PointDrawingCache& cache = drawingCache();
+  // The pass draws with the state a points drawing was built with, as a
+  // replay through OpenGL would, and records that state when there is no
+  // drawing yet (without uploading anything).
+  if (cache.kind == PointDrawingCache::Kind::None) {
+    if (drawMode_ != 0 || (nFaces_ != 0 && !drawPointsOnly_)) {
+      return false;
+    }
+    recordPointsState(threshold);
   }
-  replayDrawing();
+  const float size = cache.pointSize;
+  if (cache.kind != PointDrawingCache::Kind::Points || cache.withNormals || hasNormals_ ||
+      antialias_ || enableFog() || cache.attenuation != std::array<float, 3>{1.0f, 0.0f, 0.0f} ||
+      !(size >= 1.0f && size <= 255.0f && size == std::floor(size))) {
+    return false;
+  }
+  PointRasterBatch batch;
+  if (cache.colorMode == 1) {
+    // A plain colour is opaque whatever the layer's opacity.
+    batch.useFixedColour = true;
+    batch.fixedColour = std::uint32_t{colourByte(cache.fixedColor[0])} |
+                        std::uint32_t{colourByte(cache.fixedColor[1])} << 8 |
+                        std::uint32_t{colourByte(cache.fixedColor[2])} << 16 | 0xff000000u;
+  } else if (cache.colorMode == 0) {
+    if (alphaByte(cache.opacity) != 255) {
+      return false;
+    }
+  } else {
+    // Other colour modes draw nothing.
+    return true;
+  }
+  // The records as they are now; a drawing through OpenGL shows a change
+  // of them only once it is rebuilt.
+  batch.records = points();
+  batch.count = drawableRecordCount();
+  batch.luckThreshold = cache.threshold;
+  batch.pointSize = static_cast<int>(size);
+  return pass.submit(batch);
 }
 
 void PointLayer::replayDrawing() {

@@ -94,6 +94,8 @@ struct PointDrawingCache {
   std::int32_t colorMode = 0;
   std::array<float, 3> fixedColor{};
   bool withNormals = false;
+  // The layer's opacity when the drawing was built: the alpha of its points.
+  float opacity = 1.0f;
 
   // True when there is a drawing the current context can replay.
   bool isUsable() const;

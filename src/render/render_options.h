@@ -15,6 +15,7 @@
 namespace cloudreel {
 
 class Camera;
+class CpuPointPass;
 
 // The camera being looked through, or null.
 inline constexpr std::string_view kRenderOptionSceneCamera = "RWRenderOption_SceneCamera";
@@ -41,8 +42,15 @@ class RenderOptions {
   std::shared_ptr<Camera> sceneCamera() const;
   void setSceneCamera(std::shared_ptr<Camera> camera);
 
+  // The CPU point pass of an off-screen frame, which plain point layers
+  // hand their points to; null where everything is drawn through OpenGL
+  // (the interactive view). Not owned.
+  CpuPointPass* cpuPointPass() const { return cpuPointPass_; }
+  void setCpuPointPass(CpuPointPass* pass) { cpuPointPass_ = pass; }
+
  private:
   std::map<std::string, Value, std::less<>> values_;
+  CpuPointPass* cpuPointPass_ = nullptr;
 };
 
 }  // namespace cloudreel

@@ -10,6 +10,7 @@
 #include "platform/keyed_unarchiver.h"
 #include "platform/log.h"
 #include "platform/notification_center.h"
+#include "render/cpu_point_pass.h"
 #include "render/gl/shapes.h"
 #include "render/render_options.h"
 #include "scene/my_document.h"
@@ -140,17 +141,27 @@ void Layer::drawContentWithOptions(const RenderOptions& options) {
   }
   transformInertialToObject();
   if (isVisible_) {
+    flushPointPassBefore(*this, options);
     drawGLWithOptions(options);
   }
+  flushPointPassBefore(*this, options);
   drawDecorationsWithOptions(options);
   // A copy of the list: drawing may not change the tree under the loop.
   const std::vector<std::shared_ptr<Layer>> children = childLayers_;
   for (const auto& child : children) {
     if (child && child->isVisible()) {
+      flushPointPassBefore(*child, options);
       child->drawGLWithOptions(options);
     }
   }
   popTransformation();
+}
+
+void Layer::flushPointPassBefore(const Layer& layer, const RenderOptions& options) {
+  if (CpuPointPass* pass = options.cpuPointPass();
+      pass != nullptr && !layer.mayDrawIntoPointPass()) {
+    pass->flush();
+  }
 }
 
 void Layer::drawDecorationsWithOptions(const RenderOptions&) {}

@@ -114,10 +114,20 @@ class Layer : public Animatable3DObject {
   // children, whether or not the layer is visible (a point layer's box in
   // the editor); the base draws nothing.
   virtual void drawDecorationsWithOptions(const RenderOptions& options);
+  // True for a layer whose drawGLWithOptions may hand its points to an
+  // off-screen frame's CPU point pass instead of drawing them (and flushes
+  // the pass itself before drawing anything through OpenGL). For every
+  // other layer the traversal flushes the pass first, so that the frame is
+  // composed in the layers' order: a subclass of such a layer that draws
+  // through OpenGL in its own way answers false again.
+  virtual bool mayDrawIntoPointPass() const { return false; }
 
   // The move/rotate gizmo: points at the origin and at `size` along each
   // axis, and a circle of radius `size` in each coordinate plane.
   static void drawTrackballWithSize(float size);
+  // Draws what the options' CPU point pass holds, if any, unless `layer`
+  // may hand its own points to the pass.
+  static void flushPointPassBefore(const Layer& layer, const RenderOptions& options);
   // Red, green and blue lines of length `size` along x, y and z.
   static void drawAxesWithSize(float size);
 

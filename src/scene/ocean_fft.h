@@ -73,6 +73,8 @@ class OceanFFT : public PointLayer {
   // The lit mesh in the fixed colour (its alpha is the layer's opacity), as
   // lines when drawWireFrame is set, fogged when enableFog is.
   void drawGLWithOptions(const RenderOptions& options) override;
+  // A mesh, always drawn through OpenGL.
+  bool mayDrawIntoPointPass() const override { return false; }
 
   // The layer's "Transform" track, then "Time", "Wind Speed", "Amplitude"
   // and "Choppiness".

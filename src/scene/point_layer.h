@@ -23,6 +23,7 @@
 
 namespace cloudreel {
 
+class CpuPointPass;
 class FileInputStream;
 struct PointDrawingCache;
 
@@ -185,6 +186,7 @@ class PointLayer : public Layer {
   // invalidateOpenGLDisplayLists. Opacity, attenuation, fixed colour,
   // wireframe and points-only changes show only after a rebuild.
   void drawGLWithOptions(const RenderOptions& options) override;
+  bool mayDrawIntoPointPass() const override { return true; }
   // The bounding box, in editor frames only, whether or not the layer is
   // visible.
   void drawDecorationsWithOptions(const RenderOptions& options) override;
@@ -255,6 +257,12 @@ class PointLayer : public Layer {
   std::size_t drawableRecordCount() const;
   void buildDrawing(std::int32_t threshold);
   void replayDrawing();
+  // The state a points drawing is built with, taken from the layer.
+  void recordPointsState(std::int32_t threshold);
+  // Hands the points to an off-screen frame's CPU pass when they are plain
+  // points the pass draws exactly (see CpuPointPass); false when they must
+  // go through OpenGL.
+  bool drawPointsOnCpu(CpuPointPass& pass, std::int32_t threshold);
   void emitSpheres(std::int32_t threshold);
   void emitMesh();
 

@@ -50,17 +50,20 @@ class ScopedEnv {
 TEST(CliFarm, ADryRunPrintsTheArrayJobAndSubmitsNothing) {
   const TempDir dir;
   testing::makeSceneDocument(dir);
+  // clang-format off
   const Outcome run = cloudreel(
       dir, {"farm", "scene.reel", "--out", "frames", "--frames", "3-24", "--chunk", "10",
             "--partition", "gpu", "--time", "0:30:00", "--sbatch-arg=--gres=gpu:1", "--size",
-            "PAL Square Pixel", "--depth", "--pattern", "shot %03d.tif", "--dry-run"});
+            "PAL Square Pixel", "--depth", "--pattern", "shot %03d.tif", "--rasterizer", "cpu",
+            "--dry-run"});
+  // clang-format on
   ASSERT_EQ(run.status, 0) << run.err;
   for (const std::string& line : std::vector<std::string>{
            "#SBATCH --array=0-2\n", "#SBATCH --partition=gpu\n", "#SBATCH --time=0:30:00\n",
            "#SBATCH --gres=gpu:1\n", "chunks=(3-12 13-22 23-24)\n",
            " render " + (dir / "scene.reel").string() + " --out " + (dir / "frames").string(),
            "--frames \"${chunks[$SLURM_ARRAY_TASK_ID]}\" --skip-existing --size 'PAL Square Pixel' "
-           "--depth --pattern 'shot %03d.tif'",
+           "--depth --pattern 'shot %03d.tif' --rasterizer cpu",
            "#SBATCH --output=" + (dir / "frames/cloudreel-farm/%A_%a.log").string()}) {
     EXPECT_NE(run.out.find(line), std::string::npos) << line << "\nin\n" << run.out;
   }

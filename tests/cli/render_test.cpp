@@ -129,6 +129,7 @@ TEST(CliRender, BadInputIsRefusedInOneLineBeforeAnyFrame) {
       {{"scene.reel", "--out", "out", "--size", "huge"}, "720p"},
       {{"scene.reel", "--out", "out", "--size", "0x10"}, "WIDTHxHEIGHT"},
       {{"scene.reel", "--out", "a-file/out"}, "output folder"},
+      {{"scene.reel", "--out", "out", "--rasterizer", "fast"}, "--rasterizer"},
   };
   for (const auto& [args, message] : cases) {
     std::vector<std::string> command{"render"};
@@ -139,6 +140,37 @@ TEST(CliRender, BadInputIsRefusedInOneLineBeforeAnyFrame) {
     EXPECT_NE(run.err.find(message), std::string::npos) << run.err;
     EXPECT_EQ(std::count(run.err.begin(), run.err.end(), '\n'), 1) << run.err;
     EXPECT_FALSE(fs::exists(dir / "out"));
+  }
+}
+
+std::string fileBytes(const fs::path& file) { return testing::readFile(file); }
+
+TEST(CliRender, PointsDrawnOnTheCpuGiveTheSameFilesAsOpenGL) {
+  // The demo's reconstruction, its cameras, ocean and card: points the CPU
+  // draws between layers that OpenGL draws, mono with depth and in stereo.
+  const TempDir dir;
+  const Outcome made = cloudreel(dir, {"demo", "demo", "--no-render", "--points", "40000"});
+  ASSERT_EQ(made.status, 0) << made.err;
+  for (const std::vector<std::string>& extra :
+       {std::vector<std::string>{"--depth"}, std::vector<std::string>{"--stereo", "0.4"}}) {
+    for (const std::string rasterizer : {"gl", "cpu"}) {
+      std::vector<std::string> command{"render",       "demo/demo.reel", "--out",  rasterizer,
+                                       "--frames",     "10-12",          "--size", "240x160",
+                                       "--rasterizer", rasterizer};
+      command.insert(command.end(), extra.begin(), extra.end());
+      const Outcome run = cloudreel(dir, command);
+      ASSERT_EQ(run.status, 0) << run.err;
+    }
+    std::size_t files = 0;
+    for (const auto& entry : fs::directory_iterator(dir / "gl")) {
+      const fs::path name = entry.path().filename();
+      SCOPED_TRACE(name.string());
+      EXPECT_EQ(fileBytes(dir / "cpu" / name), fileBytes(entry.path()));
+      ++files;
+    }
+    EXPECT_EQ(files, 6u);
+    fs::remove_all(dir / "gl");
+    fs::remove_all(dir / "cpu");
   }
 }
 
