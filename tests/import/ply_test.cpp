@@ -242,6 +242,69 @@ TEST(PlyReader, StopsWhenACallbackAnswersZero) {
   }
 }
 
+// What a block callback saw: the bytes in the order they came, and whether
+// each block began where the last ended.
+struct Blocks {
+  std::string bytes;
+  long next = 0;
+  bool contiguous = true;
+  int calls = 0;
+  int stopAt = -1;
+};
+
+int keepBlock(const void* data, long first, long count, void* pdata) {
+  auto& blocks = *static_cast<Blocks*>(pdata);
+  blocks.contiguous = blocks.contiguous && first == blocks.next && count > 0;
+  blocks.next = first + count;
+  blocks.bytes.append(static_cast<const char*>(data), std::size_t(count) * 15);
+  return ++blocks.calls != blocks.stopAt;
+}
+
+// A list-free binary element reaches a block callback whole, as the file
+// stores it, over as many blocks as the buffer needs; the elements around
+// it are still read or passed over as usual. An ASCII file or an element
+// with lists has no blocks to give, and a block callback answering 0 stops
+// the read.
+TEST(PlyReader, HandsListFreeBinaryElementsOverInBlocks) {
+  const auto scene = sampleScene(70000);  // 15-byte vertices, faces with lists, an edge
+  for (const std::string format : {"binary_little_endian", "binary_big_endian"}) {
+    SCOPED_TRACE(format);
+    const std::string file = plyText(scene, format);
+    const auto path = plyFile(file);
+    Outcome outcome;
+    Blocks blocks;
+    PlyHandle ply(ply_open(path.c_str(), recordError, 0, &outcome));
+    ASSERT_TRUE(ply_read_header(ply.get()));
+    EXPECT_EQ(ply_set_block_cb(ply.get(), "vertex", keepBlock, &blocks), 70000);
+    EXPECT_EQ(ply_set_block_cb(ply.get(), "face", keepBlock, &blocks), 0);
+    EXPECT_EQ(ply_set_read_cb(ply.get(), "vertex", "x", recordCall, &outcome, 0), 70000);
+    ply_set_read_cb(ply.get(), "edge", "vertex2", recordCall, &outcome, 201);
+    ASSERT_TRUE(ply_read(ply.get()));
+    const std::size_t start = file.find("end_header\n") + 11;
+    EXPECT_TRUE(blocks.bytes == file.substr(start, 70000 * 15));
+    EXPECT_TRUE(blocks.contiguous);
+    EXPECT_GT(blocks.calls, 1);
+    // Only the edge's callback: the vertices went to the blocks.
+    EXPECT_EQ(outcome.calls, (std::vector<Call>{{201, 0, 1, 0, 2147483647}}));
+
+    Blocks stopped;
+    stopped.stopAt = 2;
+    Outcome stoppedOutcome;
+    PlyHandle again(ply_open(path.c_str(), recordError, 0, &stoppedOutcome));
+    ASSERT_TRUE(ply_read_header(again.get()));
+    ply_set_block_cb(again.get(), "vertex", keepBlock, &stopped);
+    EXPECT_FALSE(ply_read(again.get()));
+    EXPECT_EQ(stopped.calls, 2);
+    ASSERT_EQ(stoppedOutcome.errors.size(), 1u);
+    EXPECT_NE(stoppedOutcome.errors[0].find("stopped by the block callback of element 'vertex'"),
+              std::string::npos);
+  }
+  PlyHandle ascii(ply_open(plyFile(plyText(scene, "ascii")).c_str(), nullptr, 0, nullptr));
+  ASSERT_TRUE(ply_read_header(ascii.get()));
+  Blocks none;
+  EXPECT_EQ(ply_set_block_cb(ascii.get(), "vertex", keepBlock, &none), 0);
+}
+
 TEST(PlyReader, ReportsBrokenFilesThroughTheErrorCallback) {
   const std::string vertexX = "element vertex 2\nproperty float x\nend_header\n";
   const std::string faces = "element face 1\nproperty list uchar int v\nend_header\n";

@@ -28,6 +28,10 @@
 // data the instances' fixed bytes and list lengths, for ASCII one character
 // and one separator per value. So a caller may size its storage by an
 // element's instance count once the header has been read.
+//
+// A caller that knows a binary element's layout may take its instances
+// whole instead, a block at a time (ply_set_block_cb), and decode them
+// itself without a call per value.
 
 #include <cstddef>
 #include <memory>
@@ -86,6 +90,19 @@ int ply_read_header(p_ply ply);
 // element's instance count: 0 when either is not found (or has no instances).
 long ply_set_read_cb(p_ply ply, const char* element_name, const char* property_name,
                      p_ply_read_cb read_cb, void* pdata, long idata);
+// Whole instances of an element whose properties are all scalars, for a
+// caller that decodes records itself: `count` consecutive instances from
+// instance `first_index` on, packed as the file stores them (each of the
+// element's fixed size, in the file's byte order), straight from the
+// reader's buffer and valid only during the call. Answers 0 to stop.
+using p_ply_block_cb = int (*)(const void* data, long first_index, long count, void* pdata);
+// Registers a block callback for the first element of that name in a
+// binary file: its instances then reach `block_cb` in file order, as many
+// at a time as the buffer holds (at least one), and the per-property
+// callbacks of that element are not called. Answers the element's instance
+// count; 0, registering nothing, for an ASCII file or when there is no such
+// element or it has a list property.
+long ply_set_block_cb(p_ply ply, const char* element_name, p_ply_block_cb block_cb, void* pdata);
 // Reads all data once, calling the registered callbacks in file order.
 int ply_read(p_ply ply);
 // Frees the reader; null is accepted and answers 0.
@@ -108,6 +125,8 @@ e_ply_storage_mode ply_get_storage_mode(p_ply ply);
 const char* ply_storage_mode_name(e_ply_storage_mode mode);
 // The type's name as a header writes it ("float", "uint8", "list", ...).
 const char* ply_type_name(e_ply_type type);
+// The bytes a value of the scalar type takes in binary data; 0 for a list.
+std::size_t ply_type_size(e_ply_type type);
 int ply_get_ply_user_data(p_ply ply, void** pdata, long* idata);
 
 // Inside a read callback. Out-parameters may be null.
