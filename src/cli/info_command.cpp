@@ -183,13 +183,25 @@ int runInfoCommand(const InfoOptions& options) {
     bundle = counts;
   }
 
-  Error error;
-  const std::shared_ptr<PointLayer> layer = openPointCloud(path, kind, 1, &error);
-  if (!layer) {
-    reportFailure(error.message);
-    return 1;
+  // A PLY file in a layout that can be measured in passing is not imported:
+  // its summary needs no array of 16 bytes a point.
+  std::optional<PointCloudSummary> measured;
+  if (kind == PointFileKind::Ply) {
+    measured = measurePlyPointCloud(path);
   }
-  PointCloudSummary summary = summarizePointLayer(*layer);
+  PointCloudSummary summary;
+  if (measured) {
+    announceLargeFile(path);
+    summary = std::move(*measured);
+  } else {
+    Error error;
+    const std::shared_ptr<PointLayer> layer = openPointCloud(path, kind, 1, &error);
+    if (!layer) {
+      reportFailure(error.message);
+      return 1;
+    }
+    summary = summarizePointLayer(*layer);
+  }
   summary.ply = std::move(header);
   summary.bundle = bundle;
 

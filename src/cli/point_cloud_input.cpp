@@ -83,6 +83,16 @@ void reportFailure(std::string_view message) {
   std::fprintf(stderr, "cloudreel: %.*s\n", static_cast<int>(message.size()), message.data());
 }
 
+void announceLargeFile(const std::filesystem::path& path) {
+  std::error_code ec;
+  const std::uintmax_t bytes = std::filesystem::file_size(path, ec);
+  if (!ec && bytes >= kLargeFileBytes) {
+    std::fprintf(stderr, "Reading %s (%.0f MB)...\n", path.c_str(),
+                 static_cast<double>(bytes) / 1e6);
+    std::fflush(stderr);
+  }
+}
+
 std::shared_ptr<PointLayer> openPointCloud(const std::filesystem::path& path, PointFileKind kind,
                                            std::int32_t downsample, Error* error) {
   if (kind == PointFileKind::Unknown) {
@@ -92,13 +102,7 @@ std::shared_ptr<PointLayer> openPointCloud(const std::filesystem::path& path, Po
   if (!checkReadable(path, error)) {
     return nullptr;
   }
-  std::error_code ec;
-  const std::uintmax_t bytes = std::filesystem::file_size(path, ec);
-  if (!ec && bytes >= kLargeFileBytes) {
-    std::fprintf(stderr, "Reading %s (%.0f MB)...\n", path.c_str(),
-                 static_cast<double>(bytes) / 1e6);
-    std::fflush(stderr);
-  }
+  announceLargeFile(path);
 
   // On success the capture passes on what was printed; on failure it is
   // dropped (a failed layer's teardown logs too) and only the reason kept.

@@ -31,6 +31,10 @@ void reportFailure(std::string_view message);
 // folder and an open panel.
 [[nodiscard]] bool checkReadable(const std::filesystem::path& path, Error* error);
 
+// The stage line openPointCloud writes on standard error before reading a
+// large file ("Reading x.ply (150 MB)..."); nothing for a small one.
+void announceLargeFile(const std::filesystem::path& path);
+
 // The layer the file opens as: a point layer loaded from a ".rwb" file, the
 // PLYFile layer of every `downsample`-th vertex of a ".ply" file, or the
 // BundlerFile layer (every point, the cameras in its child field) of a

@@ -4,6 +4,7 @@
 
 #include "camera/camera_field.h"
 #include "camera/source_camera.h"
+#include "cli/standard_error_capture.h"
 #include "import/ply/ply.h"
 #include "import/ply_file.h"
 #include "import/text_scanner.h"
@@ -83,6 +84,25 @@ PointCloudSummary summarizePointLayer(const PointLayer& layer) {
   const std::uint8_t* luck = layer.points() + record - 1;
   for (std::size_t i = 0; i < count; ++i, luck += record) {
     ++summary.luckHistogram[*luck];
+  }
+  return summary;
+}
+
+std::optional<PointCloudSummary> measurePlyPointCloud(const std::filesystem::path& path) {
+  StandardErrorCapture capture;
+  const std::optional<PLYFile::Extent> extent = PLYFile::measureURLDownsample(path, 1);
+  if (!extent) {
+    (void)capture.release();
+    return std::nullopt;
+  }
+  // The layer of such a file has 16-byte records, no faces and no camera
+  // field, and numbers its records' luck 0-255 over and over.
+  PointCloudSummary summary;
+  summary.points = extent->nPoints;
+  summary.bbox = extent->bbox;
+  const auto count = static_cast<std::uint64_t>(std::max(extent->nPoints, std::int32_t{0}));
+  for (std::size_t luck = 0; luck < summary.luckHistogram.size(); ++luck) {
+    summary.luckHistogram[luck] = count / 256 + (luck < count % 256 ? 1 : 0);
   }
   return summary;
 }

@@ -86,6 +86,13 @@ struct PointCloudSummary {
 // counted.
 PointCloudSummary summarizePointLayer(const PointLayer& layer);
 
+// The summary of the layer a PLY file imports as (every vertex), taken in
+// one pass that keeps no records, where the file's vertex layout allows it
+// (PLYFile::measureURLDownsample). Nullopt otherwise, and for a file that
+// cannot be read, which the import then reports; anything the reader
+// printed is held back.
+std::optional<PointCloudSummary> measurePlyPointCloud(const std::filesystem::path& path);
+
 // Reads the header of the PLY file at `path`. On failure answers false with
 // the reader's reason ("<path>: <what is wrong>") in the error.
 [[nodiscard]] bool describePlyHeader(const std::filesystem::path& path,

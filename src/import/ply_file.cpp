@@ -9,9 +9,11 @@
 #include <cstring>
 #include <iterator>
 #include <limits>
+#include <optional>
 #include <vector>
 
 #include "import/ply/ply.h"
+#include "import/ply_vertex_blocks.h"
 #include "platform/file_location.h"
 
 namespace cloudreel {
@@ -209,6 +211,12 @@ bool isVertexElement(p_ply_element element) {
 
 std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::path& url,
                                                         std::int32_t factor) {
+  return initWithURLDownsample(url, factor, VertexReading::Automatic);
+}
+
+std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::path& url,
+                                                        std::int32_t factor,
+                                                        VertexReading reading) {
   auto layer = std::make_shared<PLYFile>();
   factor = std::max(factor, std::int32_t{1});
   layer->setName(lastPathComponent(url));
@@ -228,7 +236,12 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   while (vertex != nullptr && !isVertexElement(vertex)) {
     vertex = ply_get_next_element(ply.get(), vertex);
   }
-  if (vertex != nullptr) {
+  const std::optional<PlyVertexBlockLayout> blocks =
+      reading == VertexReading::Automatic ? plyVertexBlockLayout(ply.get()) : std::nullopt;
+  if (blocks) {
+    // The count "x" would answer: the first "vertex" element's.
+    vertexCount = blocks->vertexCount;
+  } else if (vertex != nullptr) {
     const VertexLayout layout = vertexLayout(vertex);
     hasColor = layout.hasColor;
     for (const Slot& slot : layout.read) {
@@ -254,10 +267,24 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   if (n > 0) {
     context.target = points;
   }
+  // The decoder fills the records, their luck and the box as the blocks
+  // arrive; only the callbacks leave that to a pass over the array after.
+  std::optional<PlyVertexDecoder> decoder;
+  if (blocks) {
+    decoder.emplace(*blocks, factor, points, static_cast<std::int32_t>(n));
+    decoder->attach(ply.get());
+  }
   if (!ply_read(ply.get())) {
     return nullptr;
   }
   ply.reset();
+  if (decoder) {
+    if (n > 0) {
+      layer->setBoundingBox(decoder->boundingBox());
+    }
+    layer->setNPoints(static_cast<std::int32_t>(n));
+    return layer;
+  }
 
   // Every record is numbered and boxed, those the read never reached (a
   // file with both colour namings fills only the first half) with their
@@ -270,6 +297,36 @@ std::shared_ptr<PLYFile> PLYFile::initWithURLDownsample(const std::filesystem::p
   }
   layer->setNPoints(static_cast<std::int32_t>(n));
   return layer;
+}
+
+std::optional<PLYFile::Extent> PLYFile::measureURLDownsample(const std::filesystem::path& url,
+                                                             std::int32_t factor) {
+  factor = std::max(factor, std::int32_t{1});
+  PlyHandle ply(ply_open(url.c_str(), nullptr, 0, nullptr));
+  if (!ply || !ply_read_header(ply.get())) {
+    return std::nullopt;
+  }
+  const std::optional<PlyVertexBlockLayout> blocks = plyVertexBlockLayout(ply.get());
+  if (!blocks) {
+    return std::nullopt;
+  }
+  // As in the import, a count an int32 cannot number is refused.
+  const long n = blocks->vertexCount / factor;
+  if (n > std::numeric_limits<std::int32_t>::max()) {
+    return std::nullopt;
+  }
+  PlyVertexDecoder decoder(*blocks, factor, nullptr, static_cast<std::int32_t>(n));
+  decoder.attach(ply.get());
+  if (!ply_read(ply.get())) {
+    return std::nullopt;
+  }
+  Extent extent;
+  extent.nPoints = static_cast<std::int32_t>(n);
+  // With no records the box stays as a blank layer's.
+  if (n > 0) {
+    extent.bbox = decoder.boundingBox();
+  }
+  return extent;
 }
 
 bool PLYFile::propertyGivesColor(std::string_view name) {

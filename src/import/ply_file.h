@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <memory>
+#include <optional>
 #include <string_view>
 
 #include "scene/point_layer.h"
@@ -26,6 +27,27 @@ class PLYFile : public PointLayer {
   // cannot be read; the reader reports why on standard error ("RPly: ...").
   static std::shared_ptr<PLYFile> initWithURLDownsample(const std::filesystem::path& url,
                                                         std::int32_t factor);
+
+  // How the vertex values reach the array. Automatic decodes whole records
+  // in blocks where the layout allows it (ply_vertex_blocks.h) and hands
+  // every value to a callback otherwise; Callbacks always does the latter,
+  // the reference the block decoding must match.
+  enum class VertexReading { Automatic, Callbacks };
+  static std::shared_ptr<PLYFile> initWithURLDownsample(const std::filesystem::path& url,
+                                                        std::int32_t factor, VertexReading reading);
+
+  // The point count and bounding box initWithURLDownsample(url, factor)
+  // would give the layer, found in one pass that keeps no records (the luck
+  // bytes of the records would be their numbers modulo 256). Only for files
+  // whose vertices are decoded in blocks; nullopt for any other, and for a
+  // file that cannot be read, whose reason the reader prints on standard
+  // error as the import would.
+  struct Extent {
+    std::int32_t nPoints = 0;
+    BoundingBox bbox{};
+  };
+  static std::optional<Extent> measureURLDownsample(const std::filesystem::path& url,
+                                                    std::int32_t factor);
 
   // Whether a property of the "vertex" element gives the points their
   // colour: a blue value, "blue" or "diffuse_blue", is what completes a

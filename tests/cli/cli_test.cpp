@@ -139,6 +139,28 @@ TEST(CliInfo, SaysWhenAPlyFileHasNoColour) {
   }
 }
 
+// Little-endian vertices are measured rather than imported; a file whose
+// data ends inside them (the header counts a list by its length alone, so
+// faces before the vertices can hide it) is refused with the reason the
+// import gives, as for a big-endian file that is imported.
+TEST(CliInfo, RefusesAPlyFileThatEndsInsideItsVertices) {
+  TempDir dir;
+  for (const std::string format : {"binary_little_endian", "binary_big_endian"}) {
+    SCOPED_TRACE(format);
+    PlyElement vertex{"vertex", cloudreel::testing::kPlyXyzRgb, {}};
+    for (int i = 0; i < 10; ++i) vertex.instances.push_back({1, 2, 3, 4, 5, 6});
+    const PlyElement face{"face", {{"int", "vertex_indices", "uchar"}}, {{3, 0, 1, 2}}};
+    const std::string whole = plyText({face, vertex}, format);
+    writeFile(dir / "cut.ply", whole.substr(0, whole.size() - 10));
+    const Outcome run = cloudreel(dir, {"info", "cut.ply"});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(run.err,
+              "cloudreel: cannot read points from cut.ply: the file ends inside element 'vertex' "
+              "(instance 9 of 10)\n");
+  }
+}
+
 // Names are bytes: a file name or a PLY header name that is not UTF-8
 // still gives valid JSON, each bad byte replaced.
 TEST(CliInfo, WritesValidJsonForNamesThatAreNotUtf8) {
