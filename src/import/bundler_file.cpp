@@ -1,8 +1,6 @@
 #include "import/bundler_file.h"
 
 #include <algorithm>
-#include <array>
-#include <cstring>
 #include <limits>
 #include <optional>
 #include <string>
@@ -11,6 +9,7 @@
 
 #include "camera/bundler_camera.h"
 #include "camera/camera_field.h"
+#include "import/bundle_points.h"
 #include "import/text_scanner.h"
 #include "platform/byte_stream.h"
 #include "platform/file_location.h"
@@ -159,8 +158,8 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
       std::max<std::uint64_t>(kCamerasAnyFileMayClaim, in->size() / kFileBytesPerCamera);
   if (cameraCount > 0 && static_cast<std::uint64_t>(cameraCount) > plausibleCameras) {
     return fail(error, "The file claims " + std::to_string(cameraCount) +
-                           " cameras, more than a reconstruction of " +
-                           std::to_string(in->size()) + " bytes has");
+                           " cameras, more than a reconstruction of " + std::to_string(in->size()) +
+                           " bytes has");
   }
   // The rest of the file cannot begin more cameras than this, counting one
   // it only begins, so an absurd count costs nothing. A scan consumes text,
@@ -187,9 +186,8 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
   // document already holds its camera field, perhaps as a camera path or a
   // track's object too: that field is refilled rather than joined by a
   // second one.
-  auto field = childLayerCount() > 0
-                   ? std::dynamic_pointer_cast<CameraField>(childLayers().front())
-                   : nullptr;
+  auto field = childLayerCount() > 0 ? std::dynamic_pointer_cast<CameraField>(childLayers().front())
+                                     : nullptr;
   if (field) {
     field->setCameras(std::move(cameras));
   } else {
@@ -209,47 +207,18 @@ bool BundlerFile::loadPointsFromURLError(const std::filesystem::path& url, Error
     setNPoints(0);
     return fail(error, "Cannot allocate point array");
   }
+  // The points begin where the scanner is; its read-ahead is read again.
+  if (!in->seek(in->size() - scanner.remainingBytes())) {
+    setNPoints(0);
+    return false;
+  }
   // Positions first, colour and luck in the last four bytes, whichever
   // record layout the layer has.
-  const std::size_t stride = recordSize();
-  BoundingBox box{};
-  std::int32_t read = 0;
-  for (; read < capacity && !scanner.atEnd(); ++read) {
-    std::array<float, 3> xyz{};
-    std::array<std::int64_t, 3> rgb{};
-    for (float& v : xyz) {
-      (void)scanner.scan(v);
-    }
-    for (std::int64_t& v : rgb) {
-      (void)scanner.scan(v);
-    }
-    // The rest of the colour line, then the view list, each whole however
-    // long: a point seen by many cameras has a long view list.
-    (void)scanner.skipLine();
-    (void)scanner.skipLine();
-
-    std::uint8_t* record = records + static_cast<std::size_t>(read) * stride;
-    std::memcpy(record, xyz.data(), sizeof xyz);
-    // The low eight bits, unclamped: 300 is stored as 44, -1 as 255.
-    for (std::size_t c = 0; c < 3; ++c) {
-      record[stride - 4 + c] = static_cast<std::uint8_t>(rgb[c]);
-    }
-    record[stride - 1] = static_cast<std::uint8_t>(read);
-
-    for (std::size_t axis = 0; axis < 3; ++axis) {
-      const double v = xyz[axis];
-      if (read == 0 || v < box[axis]) {
-        box[axis] = v;
-      }
-      if (read == 0 || v > box[axis + 3]) {
-        box[axis + 3] = v;
-      }
-    }
+  const BundlePoints read = readBundlePoints(*in, records, recordSize(), capacity, pointReading_);
+  if (read.box) {
+    setBoundingBox(*read.box);
   }
-  if (read > 0) {
-    setBoundingBox(box);
-  }
-  setNPoints(read);
+  setNPoints(read.count);
   pointsDidChange();
   return false;
 }

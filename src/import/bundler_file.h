@@ -25,6 +25,7 @@
 #include <string_view>
 #include <vector>
 
+#include "import/bundle_points.h"
 #include "scene/point_layer.h"
 
 namespace cloudreel {
@@ -72,7 +73,14 @@ class BundlerFile : public PointLayer {
   // skipped whole however long it is, so the points after it stay in step;
   // a reading that took at most 511 characters of it, as the format's first
   // reader did, went out of step after a long one.
+  //
+  // The points are read on every core (see readBundlePoints), with the
+  // records, count and box a reading on one thread gives, for any file.
   bool loadPointsFromURLError(const std::filesystem::path& url, Error* error) override;
+  // How the points are read: on every core by default. A setting of the
+  // reading, not of the layer: it is neither archived nor copied.
+  void setPointReading(const BundlePointReading& reading) { pointReading_ = reading; }
+
   // Writes nothing and answers NO (success by the inverted convention).
   bool savePointsToURLError(const std::filesystem::path& url, Error* error) const override;
   // Does nothing: a bundle file is never written back.
@@ -92,6 +100,7 @@ class BundlerFile : public PointLayer {
  private:
   std::int32_t ncameras_ = 0;
   std::vector<std::shared_ptr<Camera>> cameras_;
+  BundlePointReading pointReading_;
 };
 
 }  // namespace cloudreel

@@ -16,11 +16,6 @@ constexpr std::size_t kChunk = std::size_t{64} << 10;
 // A line read stops after this many characters, as fgets into 512 bytes does.
 constexpr std::size_t kLineLimit = 511;
 
-// The C locale's white space, whatever locale the application runs in.
-bool isSpace(int c) {
-  return c == ' ' || c == '\t' || c == '\n' || c == '\v' || c == '\f' || c == '\r';
-}
-
 // The field without a leading '+', which from_chars does not take.
 const char* numberStart(const char* first, const char* last) {
   return first != last && *first == '+' ? first + 1 : first;
@@ -85,7 +80,7 @@ bool TextScanner::skipLine() {
 
 bool TextScanner::atEnd() {
   while (fill()) {
-    while (next_ < end_ && isSpace(static_cast<unsigned char>(buffer_[next_]))) {
+    while (next_ < end_ && isSpace(buffer_[next_])) {
       ++next_;
     }
     if (next_ < end_) {
@@ -106,18 +101,18 @@ bool TextScanner::nextField() {
   while (fill()) {
     const char* run = buffer_.data() + next_;
     std::size_t length = 0;
-    while (next_ + length < end_ && !isSpace(static_cast<unsigned char>(run[length]))) {
+    while (next_ + length < end_ && !isSpace(run[length])) {
       ++length;
     }
     if (fieldLength_ == 0 && next_ + length < end_) {
       // Whole in the buffer: parsed where it lies, which stays valid until
       // the next fill.
       fieldData_ = run;
-      fieldLength_ = std::min(length, sizeof(field_) - 1);
+      fieldLength_ = std::min(length, kFieldLimit);
       next_ += length;
       break;
     }
-    const std::size_t kept = std::min(length, sizeof(field_) - 1 - fieldLength_);
+    const std::size_t kept = std::min(length, kFieldLimit - fieldLength_);
     std::memcpy(field_ + fieldLength_, run, kept);
     fieldLength_ += kept;
     next_ += length;
@@ -128,12 +123,9 @@ bool TextScanner::nextField() {
   return true;
 }
 
-bool TextScanner::scan(std::int64_t& value) {
-  if (!nextField()) {
-    return false;
-  }
-  const char* last = fieldData_ + fieldLength_;
-  const char* first = numberStart(fieldData_, last);
+bool TextScanner::parseField(const char* field, std::size_t length, std::int64_t& value) {
+  const char* last = field + std::min(length, kFieldLimit);
+  const char* first = numberStart(field, last);
   std::int64_t parsed = 0;
   const auto [ptr, ec] = std::from_chars(first, last, parsed);
   if (ec == std::errc::result_out_of_range) {
@@ -149,7 +141,7 @@ namespace {
 
 template <typename F>
 bool parseFloating(const char* field, std::size_t length, F& value) {
-  const char* last = field + length;
+  const char* last = field + std::min(length, TextScanner::kFieldLimit);
   F parsed = 0;
   const auto [ptr, ec] = std::from_chars(numberStart(field, last), last, parsed);
   value = ec == std::errc() ? parsed : F{0};
@@ -158,12 +150,24 @@ bool parseFloating(const char* field, std::size_t length, F& value) {
 
 }  // namespace
 
+bool TextScanner::parseField(const char* field, std::size_t length, float& value) {
+  return parseFloating(field, length, value);
+}
+
+bool TextScanner::parseField(const char* field, std::size_t length, double& value) {
+  return parseFloating(field, length, value);
+}
+
+bool TextScanner::scan(std::int64_t& value) {
+  return nextField() && parseField(fieldData_, fieldLength_, value);
+}
+
 bool TextScanner::scan(float& value) {
-  return nextField() && parseFloating(fieldData_, fieldLength_, value);
+  return nextField() && parseField(fieldData_, fieldLength_, value);
 }
 
 bool TextScanner::scan(double& value) {
-  return nextField() && parseFloating(fieldData_, fieldLength_, value);
+  return nextField() && parseField(fieldData_, fieldLength_, value);
 }
 
 }  // namespace cloudreel

@@ -40,6 +40,19 @@ class TextScanner {
   bool scan(float& value);
   bool scan(double& value);
 
+  // The rules the scans above read a field by, for readers that hold the
+  // text in memory and must read it as the scanner would: white space is
+  // the C locale's, a field's first kFieldLimit characters are its number.
+  static constexpr std::size_t kFieldLimit = 511;
+  static constexpr bool isSpace(char c) {
+    return c == ' ' || c == '\t' || c == '\n' || c == '\v' || c == '\f' || c == '\r';
+  }
+  // The value of the field of `length` characters at `field` (at most
+  // kFieldLimit of them are looked at) and the answer, as scan gives them.
+  static bool parseField(const char* field, std::size_t length, std::int64_t& value);
+  static bool parseField(const char* field, std::size_t length, float& value);
+  static bool parseField(const char* field, std::size_t length, double& value);
+
   // Skips white space and answers whether any text remains.
   bool atEnd();
   // Bytes not yet consumed.
@@ -57,7 +70,7 @@ class TextScanner {
   // The field read last: in the buffer where it lies whole there, else
   // gathered into field_.
   const char* fieldData_ = nullptr;
-  char field_[512] = {};
+  char field_[kFieldLimit + 1] = {};
   std::size_t fieldLength_ = 0;
 };
 

@@ -33,6 +33,20 @@ std::string points(int count) {
 
 using testing::writeFile;
 
+// The readings every file is read with: one per core, one thread, and two
+// threads on blocks so small that points cross their ends.
+const BundlePointReading kReadings[] = {{}, {1}, {2, 16}, {3, 5}};
+
+// Every case paired with every reading.
+template <typename Case, std::size_t N>
+std::vector<std::pair<Case, BundlePointReading>> casesWithReadings(const Case (&cases)[N]) {
+  std::vector<std::pair<Case, BundlePointReading>> pairs;
+  for (const Case& c : cases) {
+    for (const BundlePointReading& reading : kReadings) pairs.emplace_back(c, reading);
+  }
+  return pairs;
+}
+
 std::vector<std::shared_ptr<Camera>> fieldCameras(const BundlerFile& layer) {
   const auto field = layer.childLayerCount() > 0
                          ? std::dynamic_pointer_cast<CameraField>(layer.childLayers()[0])
@@ -100,13 +114,14 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
       {"words for numbers", "#\nmany 2\n" + kCamera, "", 0, 2},
       {"words in a point", "#\n0 2\nx y z\nr g b\n\n" + points(1), "", 0, 2},
   };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.name);
+  for (const auto& [c, reading] : casesWithReadings(cases)) {
+    SCOPED_TRACE(c.name + ", " + std::to_string(reading.threads) + " threads");
     const auto url = dir / c.name;
     if (c.name != "missing") {
       writeFile(url, c.text);
     }
     BundlerFile layer;
+    layer.setPointReading(reading);
     Error error;
     EXPECT_EQ(layer.loadPointsFromURLError(url, &error), !c.error.empty());
     // The application's own domain, not the point file's "myDomain".
@@ -126,8 +141,8 @@ TEST(BundlerFile, MissingEmptyDamagedAndBoastfulFilesGiveAnErrorOrWhatTheyHold) 
 // buffer ends, so the points after them are read in step.
 TEST(BundlerFile, LongViewListsAreSkippedWhole) {
   const testing::TempDir dir;
-  for (const std::size_t length : {511u, 512u, 5000u, 200000u}) {
-    SCOPED_TRACE(length);
+  for (const auto& [length, reading] : casesWithReadings({511u, 512u, 5000u, 200000u})) {
+    SCOPED_TRACE(std::to_string(length) + ", " + std::to_string(reading.threads) + " threads");
     std::string views;
     while (views.size() < length) views += "2 0 12 3.5 -1 ";
     views.resize(length);
@@ -136,6 +151,7 @@ TEST(BundlerFile, LongViewListsAreSkippedWhole) {
                                                       "10 11 12 " + tail + "\n" + views +
                                                       "\n13 14 15\n16 17 18\n" + views + "\n");
     BundlerFile layer;
+    layer.setPointReading(reading);
     ASSERT_FALSE(layer.loadPointsFromURLError(url, nullptr));
     std::vector<std::array<int, 4>> points;
     for (const color_point& p : layer.colorPoints()) points.push_back({int(p.x), p.r, p.g, p.b});
@@ -196,6 +212,7 @@ TEST(BundlerFile, PhotographsNamedByAnotherMachinesPathsAreFoundUnderTheRoot) {
 struct ImportCost {
   long long peakGrowth = -1;
   long long cameras = -1;
+  long long points = -1;
 };
 
 ImportCost importInAChild(const std::filesystem::path& url) {
@@ -216,7 +233,8 @@ ImportCost importInAChild(const std::filesystem::path& url) {
     (void)layer.loadPointsFromURLError(url, nullptr);
     ::getrusage(RUSAGE_SELF, &after);
     // ru_maxrss counts kibibytes.
-    const ImportCost cost{(after.ru_maxrss - before.ru_maxrss) * 1024LL, layer.ncameras()};
+    const ImportCost cost{(after.ru_maxrss - before.ru_maxrss) * 1024LL, layer.ncameras(),
+                          layer.nPoints()};
     const bool sent = ::write(out[1], &cost, sizeof cost) == ssize_t(sizeof cost);
     ::_exit(sent ? 0 : 1);
   }
@@ -260,6 +278,26 @@ TEST(BundlerFile, AHostileFileOrListClaimsMemoryOnlyInProportionToItsSize) {
   const ImportCost photographs = importInAChild(bundle);
   EXPECT_EQ(photographs.cameras, 100);
   EXPECT_LE(photographs.peakGrowth, 4 * static_cast<long long>(list.size()));
+}
+
+// The points are read a block of text at a time, on every core: the import
+// holds its points and a block or so of the file, never the file.
+TEST(BundlerFile, ALargeFileCostsTheMemoryOfItsPointsNotOfItsText) {
+  const testing::TempDir root;
+  std::string views = "300";
+  for (int v = 0; v < 300; ++v) views += " 17 2345 -120.25 99.5";
+  std::string text = "# Bundle file v0.3\n1 4000\n" + kCamera;
+  for (int i = 0; i < 4000; ++i) {
+    text += "1.5e-3 " + std::to_string(i) + " 2\n10 20 30\n" + views + "\n";
+  }
+  const auto url = writeFile(root / "bundle/bundle.out", text);
+#if defined(__SANITIZE_ADDRESS__)
+  GTEST_SKIP() << "resident memory is not the program's own under AddressSanitizer";
+#endif
+  const ImportCost cost = importInAChild(url);
+  EXPECT_EQ(cost.points, 4000);
+  // The file is 25 MB, its points 64 KB, the text held at most 2 MiB.
+  EXPECT_LE(cost.peakGrowth, static_cast<long long>(text.size() / 5));
 }
 
 TEST(BundlerFile, ALinkedLayerIsReadFromItsFileAgainWhenDecoded) {
