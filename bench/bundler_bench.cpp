@@ -3,6 +3,8 @@
 // (positions in scientific notation with ten decimals, a view list of two to
 // five views per point), read from the page cache. Reported as points per
 // second, with the import's peak memory over the point array it leaves.
+// The points are read on every core; BM_ImportBundleFileOneThread reads
+// them on one, for comparison.
 //
 // CLOUDREEL_BENCH_DIR sets the folder for the reconstruction (default the
 // temporary folder); it is written once per run and removed at its end. It
@@ -25,8 +27,8 @@
 #include <string>
 #include <string_view>
 
-#include "import/bundler_file.h"
 #include "bench_files.h"
+#include "import/bundler_file.h"
 #include "peak_memory.h"
 #include "platform/application_defaults.h"
 #include "platform/log.h"
@@ -152,11 +154,22 @@ BenchFile& benchFile() {
 // is reset to the current resident size first, and the figure is what the
 // import adds to the resident size at its peak over the bytes of the array
 // it leaves (0 when /proc/self/clear_refs cannot be written). Null, with the
-// reason in `failure`, when the layer is not the file's.
-std::shared_ptr<BundlerFile> importChecked(const std::filesystem::path& path, double& peakOverArray,
-                                           const char*& failure) {
+// reason in `failure`, when the layer is not the file's. With `oneThread`
+// the layer is read as a blank one told to read on one thread (the import
+// command's naming and linking, which it skips, cost next to nothing).
+std::shared_ptr<BundlerFile> importChecked(const std::filesystem::path& path, bool oneThread,
+                                           double& peakOverArray, const char*& failure) {
   const bench::PeakMemory peak;
-  auto layer = BundlerFile::initWithURLShouldLink(path, false);
+  std::shared_ptr<BundlerFile> layer;
+  if (oneThread) {
+    layer = std::make_shared<BundlerFile>();
+    layer->setPointReading({1});
+    if (layer->loadPointsFromURLError(path, nullptr)) {
+      layer.reset();
+    }
+  } else {
+    layer = BundlerFile::initWithURLShouldLink(path, false);
+  }
   if (!layer || layer->nPoints() != kPoints || layer->ncameras() != kCameras) {
     failure = "the import failed";
     return nullptr;
@@ -173,7 +186,7 @@ std::shared_ptr<BundlerFile> importChecked(const std::filesystem::path& path, do
 // The first import of a process is timed on its own (first_import_ms), as it
 // takes the array's memory fresh from the system; the rate is that of the
 // imports after it.
-void BM_ImportBundleFile(benchmark::State& state) {
+void importBundleFile(benchmark::State& state, bool oneThread) {
   const BenchFile& file = benchFile();
   if (!file.ok) {
     state.SkipWithError("cannot write the reconstruction");
@@ -182,14 +195,14 @@ void BM_ImportBundleFile(benchmark::State& state) {
   double peak = 0.0;
   const char* failure = nullptr;
   const auto start = std::chrono::steady_clock::now();
-  if (!importChecked(file.path, peak, failure)) {
+  if (!importChecked(file.path, oneThread, peak, failure)) {
     state.SkipWithError(failure);
     return;
   }
   const std::chrono::duration<double, std::milli> first = std::chrono::steady_clock::now() - start;
   double worstPeak = peak;
   for (auto _ : state) {
-    auto layer = importChecked(file.path, peak, failure);
+    auto layer = importChecked(file.path, oneThread, peak, failure);
     state.PauseTiming();
     if (!layer) {
       state.SkipWithError(failure);
@@ -204,7 +217,14 @@ void BM_ImportBundleFile(benchmark::State& state) {
   state.counters["peak_over_array"] = worstPeak;
   state.counters["first_import_ms"] = first.count();
 }
+
+void BM_ImportBundleFile(benchmark::State& state) { importBundleFile(state, false); }
+void BM_ImportBundleFileOneThread(benchmark::State& state) { importBundleFile(state, true); }
 BENCHMARK(BM_ImportBundleFile)->Iterations(5)->UseRealTime()->Unit(benchmark::kMillisecond);
+BENCHMARK(BM_ImportBundleFileOneThread)
+    ->Iterations(5)
+    ->UseRealTime()
+    ->Unit(benchmark::kMillisecond);
 
 }  // namespace
 }  // namespace cloudreel

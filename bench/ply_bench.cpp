@@ -3,7 +3,10 @@
 // callback that stores it into a packed 16-byte record. Ten million vertices,
 // in binary little-endian and in ASCII, reported as vertices per second.
 // Then the same files imported as a PLYFile layer, with the import's peak
-// memory over the array it ends with.
+// memory over the array it ends with: binary files take the block decoding
+// (also with double coordinates, and with normals), and the same binary
+// file through the per-value callbacks is kept beside it for comparison.
+// Last, the measuring pass `cloudreel info` makes of a binary file.
 //
 // CLOUDREEL_BENCH_DIR sets the folder for the files (default the temporary
 // folder); they are written once per run and removed at its end.
@@ -22,9 +25,9 @@
 #include <string>
 #include <vector>
 
+#include "bench_files.h"
 #include "import/ply/ply.h"
 #include "import/ply_file.h"
-#include "bench_files.h"
 #include "peak_memory.h"
 
 namespace cloudreel {
@@ -53,20 +56,57 @@ Record vertex(long i) {
                 0};
 }
 
-std::string header(const char* format) {
-  return std::string("ply\nformat ") + format + " 1.0\nelement vertex " +
-         std::to_string(kVertices) +
-         "\nproperty float x\nproperty float y\nproperty float z\n"
-         "property uchar red\nproperty uchar green\nproperty uchar blue\nend_header\n";
+// The vertex layouts of the files: the coordinates as float or double,
+// normals (float) between them and the colour or none.
+enum class Layout { Float, Double, FloatWithNormals };
+
+std::string header(const char* format, Layout layout) {
+  const std::string coordinate = layout == Layout::Double ? "double" : "float";
+  std::string text = std::string("ply\nformat ") + format + " 1.0\nelement vertex " +
+                     std::to_string(kVertices) + "\n";
+  for (const char* axis : {"x", "y", "z"}) {
+    text += "property " + coordinate + " " + axis + "\n";
+  }
+  if (layout == Layout::FloatWithNormals) {
+    text += "property float nx\nproperty float ny\nproperty float nz\n";
+  }
+  return text + "property uchar red\nproperty uchar green\nproperty uchar blue\nend_header\n";
 }
 
-bool writeFile(const std::filesystem::path& path, bool ascii) {
+// Binary records are written with the machine's byte order: the benchmarks
+// run on little-endian machines only.
+void appendBinary(std::string& text, const Record& r, Layout layout) {
+  auto put = [&text](auto value) {
+    char bytes[sizeof value];
+    std::memcpy(bytes, &value, sizeof value);
+    text.append(bytes, sizeof value);
+  };
+  if (layout == Layout::Double) {
+    put(double{r.x});
+    put(double{r.y});
+    put(double{r.z});
+  } else {
+    put(r.x);
+    put(r.y);
+    put(r.z);
+  }
+  if (layout == Layout::FloatWithNormals) {
+    put(0.0f);
+    put(0.0f);
+    put(1.0f);
+  }
+  put(r.red);
+  put(r.green);
+  put(r.blue);
+}
+
+bool writeFile(const std::filesystem::path& path, bool ascii, Layout layout = Layout::Float) {
   bench::ChunkedTextFile file(path);
   if (!file.isOpen()) {
     return false;
   }
   std::string& text = file.text();
-  text = header(ascii ? "ascii" : "binary_little_endian");
+  text = header(ascii ? "ascii" : "binary_little_endian", layout);
   // Appends a number and the separator after it.
   auto put = [&text](auto value, char separator) {
     char digits[32];
@@ -83,9 +123,7 @@ bool writeFile(const std::filesystem::path& path, bool ascii) {
       put(unsigned{r.green}, ' ');
       put(unsigned{r.blue}, '\n');
     } else {
-      char bytes[15];
-      std::memcpy(bytes, &r, 15);  // little-endian machines only, as the benchmarks run
-      text.append(bytes, 15);
+      appendBinary(text, r, layout);
     }
     if (!file.flushIfFull()) {
       return false;
@@ -114,6 +152,30 @@ struct BenchFiles {
 BenchFiles& benchFiles() {
   static BenchFiles files;
   return files;
+}
+
+// A binary file of another layout, written when its benchmark first runs
+// and removed when the program ends; empty when it cannot be written.
+struct LayoutFile {
+  explicit LayoutFile(Layout layout) {
+    path =
+        bench::benchFolder() / (layout == Layout::Double ? "cloudreel-bench-vertices-double.ply"
+                                                         : "cloudreel-bench-vertices-normals.ply");
+    if (!writeFile(path, false, layout)) {
+      path.clear();
+    }
+  }
+  ~LayoutFile() {
+    std::error_code ignored;
+    std::filesystem::remove(path, ignored);
+  }
+  std::filesystem::path path;
+};
+
+const std::filesystem::path& layoutFile(Layout layout) {
+  static LayoutFile doubles(Layout::Double);
+  static LayoutFile normals(Layout::FloatWithNormals);
+  return layout == Layout::Double ? doubles.path : normals.path;
 }
 
 struct Context {
@@ -204,10 +266,11 @@ BENCHMARK(BM_ReadAscii)->Iterations(3)->UseRealTime()->Unit(benchmark::kMillisec
 // import adds to the resident size at its peak over the bytes of the array
 // it leaves (0 when /proc/self/clear_refs cannot be written). Null, with the
 // reason in `failure`, when the layer is not the file's.
-std::shared_ptr<PLYFile> importChecked(const std::filesystem::path& path, double& peakOverArray,
+std::shared_ptr<PLYFile> importChecked(const std::filesystem::path& path,
+                                       PLYFile::VertexReading reading, double& peakOverArray,
                                        const char*& failure) {
   const bench::PeakMemory peak;
-  auto layer = PLYFile::initWithURLDownsample(path, 1);
+  auto layer = PLYFile::initWithURLDownsample(path, 1, reading);
   if (!layer || layer->nPoints() != kVertices) {
     failure = "the import failed";
     return nullptr;
@@ -225,8 +288,9 @@ std::shared_ptr<PLYFile> importChecked(const std::filesystem::path& path, double
 // is the one that takes the array's memory fresh from the system, which on
 // a virtual machine can cost far more than in later imports. The rate is
 // that of the imports after it.
-void importLayer(benchmark::State& state, const std::filesystem::path& path) {
-  if (!benchFiles().ok) {
+void importLayer(benchmark::State& state, const std::filesystem::path& path,
+                 PLYFile::VertexReading reading = PLYFile::VertexReading::Automatic) {
+  if (!benchFiles().ok || path.empty()) {
     state.SkipWithError("cannot write the benchmark files");
     return;
   }
@@ -234,14 +298,14 @@ void importLayer(benchmark::State& state, const std::filesystem::path& path) {
   double worstPeak = 0.0;
   const char* failure = nullptr;
   const auto start = std::chrono::steady_clock::now();
-  if (!importChecked(path, peak, failure)) {
+  if (!importChecked(path, reading, peak, failure)) {
     state.SkipWithError(failure);
     return;
   }
   const std::chrono::duration<double, std::milli> first = std::chrono::steady_clock::now() - start;
   worstPeak = peak;
   for (auto _ : state) {
-    auto layer = importChecked(path, peak, failure);
+    auto layer = importChecked(path, reading, peak, failure);
     state.PauseTiming();
     if (!layer) {
       state.SkipWithError(failure);
@@ -266,8 +330,53 @@ BENCHMARK(BM_ImportLayerBinaryLittleEndian)
     ->UseRealTime()
     ->Unit(benchmark::kMillisecond);
 
+void BM_ImportLayerBinaryLittleEndianCallbacks(benchmark::State& state) {
+  importLayer(state, benchFiles().binary, PLYFile::VertexReading::Callbacks);
+}
+BENCHMARK(BM_ImportLayerBinaryLittleEndianCallbacks)
+    ->Iterations(5)
+    ->UseRealTime()
+    ->Unit(benchmark::kMillisecond);
+
+void BM_ImportLayerBinaryDouble(benchmark::State& state) {
+  importLayer(state, layoutFile(Layout::Double));
+}
+BENCHMARK(BM_ImportLayerBinaryDouble)->Iterations(5)->UseRealTime()->Unit(benchmark::kMillisecond);
+
+void BM_ImportLayerBinaryWithNormals(benchmark::State& state) {
+  importLayer(state, layoutFile(Layout::FloatWithNormals));
+}
+BENCHMARK(BM_ImportLayerBinaryWithNormals)
+    ->Iterations(5)
+    ->UseRealTime()
+    ->Unit(benchmark::kMillisecond);
+
 void BM_ImportLayerAscii(benchmark::State& state) { importLayer(state, benchFiles().ascii); }
 BENCHMARK(BM_ImportLayerAscii)->Iterations(3)->UseRealTime()->Unit(benchmark::kMillisecond);
+
+// The count and box of the binary file without an array, as `cloudreel
+// info` takes them.
+void BM_MeasureBinaryLittleEndian(benchmark::State& state) {
+  if (!benchFiles().ok) {
+    state.SkipWithError("cannot write the benchmark files");
+    return;
+  }
+  for (auto _ : state) {
+    const auto extent = PLYFile::measureURLDownsample(benchFiles().binary, 1);
+    if (!extent || extent->nPoints != kVertices) {
+      state.SkipWithError("measuring failed");
+      return;
+    }
+    benchmark::DoNotOptimize(extent->bbox);
+  }
+  state.counters["vertices_per_second"] =
+      benchmark::Counter(static_cast<double>(kVertices) * static_cast<double>(state.iterations()),
+                         benchmark::Counter::kIsRate);
+}
+BENCHMARK(BM_MeasureBinaryLittleEndian)
+    ->Iterations(5)
+    ->UseRealTime()
+    ->Unit(benchmark::kMillisecond);
 
 }  // namespace
 }  // namespace cloudreel
