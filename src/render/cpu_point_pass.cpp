@@ -140,6 +140,7 @@ void CpuPointPass::beginFrame(int width, int height, int depthBits) {
   pending_.clear();
   failure_.reset();
   pointsThisFrame_ = 0;
+  held_ = false;
   width_ = std::max(width, 0);
   height_ = std::max(height, 0);
   depthBits_ = depthBits;
@@ -169,7 +170,11 @@ bool CpuPointPass::fail(std::string message) {
   return false;
 }
 
-bool CpuPointPass::flush() {
+bool CpuPointPass::flush() { return drawPending() && writeBack(); }
+
+bool CpuPointPass::flushKeepingFrame() { return drawPending(); }
+
+bool CpuPointPass::drawPending() {
   if (pending_.empty()) {
     return !failure_;
   }
@@ -177,32 +182,43 @@ bool CpuPointPass::flush() {
     pending_.clear();
     return true;
   }
-  const auto pixels = static_cast<std::size_t>(width_) * static_cast<std::size_t>(height_);
-  try {
-    colour_.resize(pixels);
-    depth_.resize(pixels);
-  } catch (const std::bad_alloc&) {
-    return fail("Not enough memory to draw points on the CPU");
+  if (!held_) {
+    const auto pixels = static_cast<std::size_t>(width_) * static_cast<std::size_t>(height_);
+    try {
+      colour_.resize(pixels);
+      depth_.resize(pixels);
+    } catch (const std::bad_alloc&) {
+      return fail("Not enough memory to draw points on the CPU");
+    }
+    // OpenGL errors are left for the frame's own check after drawing, which
+    // reports them whoever caused them.
+    const gl::TightPixelStore store;
+    const GLint read = integer(GL_READ_FRAMEBUFFER_BINDING);
+    glBindFramebuffer(GL_READ_FRAMEBUFFER, static_cast<GLuint>(target_));
+    glReadPixels(0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE, colour_.data());
+    glReadPixels(0, 0, width_, height_, GL_DEPTH_COMPONENT, GL_UNSIGNED_INT, depth_.data());
+    glBindFramebuffer(GL_READ_FRAMEBUFFER, static_cast<GLuint>(read));
   }
-  if (!ensureUploadTarget()) {
-    return fail("Cannot make the framebuffer that points drawn on the CPU are written back from");
-  }
-  // OpenGL errors are left for the frame's own check after drawing, which
-  // reports them whoever caused them.
-  const gl::TightPixelStore store;
-  const GLint read = integer(GL_READ_FRAMEBUFFER_BINDING);
-  // Read back once.
-  glBindFramebuffer(GL_READ_FRAMEBUFFER, static_cast<GLuint>(target_));
-  glReadPixels(0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE, colour_.data());
-  glReadPixels(0, 0, width_, height_, GL_DEPTH_COMPONENT, GL_UNSIGNED_INT, depth_.data());
   const PointRasterTarget target{width_, height_, colour_.data(), depth_.data()};
   const bool drawn = rasterizer_.draw(target, pending_);
   pending_.clear();
   if (!drawn) {
     return fail("Not enough memory to draw points on the CPU");
   }
-  // Written back once: into the upload textures, then blitted across.
-  GLint texture = integer(GL_TEXTURE_BINDING_2D);
+  held_ = true;
+  return true;
+}
+
+bool CpuPointPass::writeBack() {
+  if (!held_) {
+    return !failure_;
+  }
+  held_ = false;
+  if (!ensureUploadTarget()) {
+    return fail("Cannot make the framebuffer that points drawn on the CPU are written back from");
+  }
+  const gl::TightPixelStore store;
+  const GLint texture = integer(GL_TEXTURE_BINDING_2D);
   glBindTexture(GL_TEXTURE_2D, colourTexture_.get());
   glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE,
                   colour_.data());
@@ -212,6 +228,7 @@ bool CpuPointPass::flush() {
   glBindTexture(GL_TEXTURE_2D, static_cast<GLuint>(texture));
   const GLboolean scissor = glIsEnabled(GL_SCISSOR_TEST);
   glDisable(GL_SCISSOR_TEST);
+  const GLint read = integer(GL_READ_FRAMEBUFFER_BINDING);
   glBindFramebuffer(GL_READ_FRAMEBUFFER, uploadFramebuffer_.get());
   glBindFramebuffer(GL_DRAW_FRAMEBUFFER, static_cast<GLuint>(target_));
   glBlitFramebuffer(0, 0, width_, height_, 0, 0, width_, height_,

@@ -63,6 +63,17 @@ class CpuPointPass {
   // Nothing to do answers true at once. False when the frame could not be
   // read, drawn or written back; the reason is kept for failure().
   bool flush();
+  // The same at the end of a frame, keeping the finished frame here instead
+  // of writing it back: a caller that only wants its colour takes it from
+  // heldColour(), and writeBack() completes the framebuffer when anything
+  // must read it there. A new frame drops what is held.
+  bool flushKeepingFrame();
+  bool holdsFrame() const { return held_; }
+  // The held frame's colour, bottom row first (see PointRasterTarget).
+  const std::vector<std::uint32_t>& heldColour() const { return colour_; }
+  // Writes a held frame back into the framebuffer; true when there was
+  // none.
+  bool writeBack();
 
   // The first failure of the frame, if any.
   const std::optional<Error>& failure() const { return failure_; }
@@ -72,6 +83,9 @@ class CpuPointPass {
  private:
   bool ensureUploadTarget();
   bool fail(std::string message);
+  // Reads the framebuffer back (unless this copy is already the frame) and
+  // draws the waiting points into the copy.
+  bool drawPending();
 
   PointRasterizer rasterizer_;
   std::vector<PointRasterBatch> pending_;
@@ -90,6 +104,9 @@ class CpuPointPass {
   int uploadDepthBits_ = 0;
   std::optional<Error> failure_;
   std::size_t pointsThisFrame_ = 0;
+  // colour_ and depth_ are the frame, and the framebuffer lacks the last
+  // points drawn into them.
+  bool held_ = false;
 };
 
 }  // namespace cloudreel

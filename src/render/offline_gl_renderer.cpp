@@ -3,6 +3,7 @@
 #include <epoxy/gl.h>
 
 #include <array>
+#include <cstring>
 #include <ctime>
 
 #include "camera/camera.h"
@@ -195,6 +196,10 @@ OfflineGLRenderer::DrawnFrame OfflineGLRenderer::drawFrameOfDocumentForCamera(
   drawColour(0.0f, paths[0]);
   if (isDepthRender_) {
     DrawnFrame::DepthFile file{paths[1], spareDepthImage()};
+    if (!completeFramebuffer() && !drawn.failed) {
+      drawn.failed = true;
+      drawn.error = *pointPass_->failure();
+    }
     if (!framebuffer_->readDepth(file.image, &failure) && !drawn.failed) {
       drawn.failed = true;
       drawn.error = failure;
@@ -284,8 +289,9 @@ void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document
   renderOptions_.setCpuPointPass(pass);
   document.drawContentWithOptions(renderOptions_);
   if (pass != nullptr) {
-    // The points of the last layers.
-    pass->flush();
+    // The points of the last layers stay in the pass until something reads
+    // the framebuffer itself: the colour frame is read from the pass.
+    pass->flushKeepingFrame();
     renderOptions_.setCpuPointPass(nullptr);
   }
   glFinish();
@@ -296,8 +302,27 @@ void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document
 }
 
 bool OfflineGLRenderer::readColorFrame(gl::RgbaImage& out, Error* error) {
+  if (pointPass_ && pointPass_->holdsFrame() && framebuffer_) {
+    // The frame as the pass holds it, bottom row first, turned top row
+    // first as the framebuffer reads.
+    const int width = framebuffer_->width();
+    const int height = framebuffer_->height();
+    out.width = width;
+    out.height = height;
+    out.pixels.resize(out.rowBytes() * static_cast<std::size_t>(height));
+    const std::uint32_t* colour = pointPass_->heldColour().data();
+    for (int y = 0; y < height; ++y) {
+      std::memcpy(
+          out.pixels.data() + out.rowBytes() * static_cast<std::size_t>(y),
+          colour + static_cast<std::size_t>(width) * static_cast<std::size_t>(height - 1 - y),
+          out.rowBytes());
+    }
+    return true;
+  }
   return framebuffer_ && framebuffer_->readColor(out, error);
 }
+
+bool OfflineGLRenderer::completeFramebuffer() { return !pointPass_ || pointPass_->writeBack(); }
 
 // The design's single-file saves, as a drawn frame of one file each.
 bool OfflineGLRenderer::saveColorFrame(const std::filesystem::path& path, Error* error) {
@@ -312,7 +337,8 @@ bool OfflineGLRenderer::saveColorFrame(const std::filesystem::path& path, Error*
 bool OfflineGLRenderer::saveDepthFrame(const std::filesystem::path& path, Error* error) {
   DrawnFrame drawn;
   drawn.depth = DrawnFrame::DepthFile{path, spareDepthImage()};
-  if (!framebuffer_ || !framebuffer_->readDepth(drawn.depth->image, error)) {
+  if (!framebuffer_ || !completeFramebuffer() ||
+      !framebuffer_->readDepth(drawn.depth->image, error)) {
     return false;
   }
   return writeDrawnFrame(drawn, error);

@@ -85,8 +85,16 @@ class OfflineGLRenderer {
   // renderer's framebuffer, with the frustum already set up by the caller
   // (renderFrameOfDocumentForCamera does it). The renderer's context must be
   // current (CurrentContext around the draw and the save or read after it).
+  // Points placed on the CPU after the frame's last OpenGL drawing reach
+  // the framebuffer only when it is read through the renderer (the read
+  // and save functions below) or completeFramebuffer() is called; the
+  // colour frame is then taken without reading OpenGL at all.
   void renderColorFrameOfDocumentForCamera(MyDocument& document,
                                            const std::shared_ptr<Camera>& camera);
+  // Puts the last frame's CPU points into the framebuffer, for a caller
+  // that reads it with OpenGL itself. False, with the reason in the pass's
+  // failure, if they could not be written back.
+  bool completeFramebuffer();
   // Read back what was drawn, top row first, and write it atomically.
   bool saveColorFrame(const std::filesystem::path& path, Error* error = nullptr);
   bool saveDepthFrame(const std::filesystem::path& path, Error* error = nullptr);

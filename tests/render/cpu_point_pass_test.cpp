@@ -109,6 +109,7 @@ class CpuPointPassTest : public testing::PixelTest {
     }
     frame.pointsOnCpu = renderer->pointsDrawnOnCpu();
     const gl::CurrentContext current(renderer->context());
+    EXPECT_TRUE(renderer->completeFramebuffer());
     frame.depth.resize(static_cast<std::size_t>(kWidth * kHeight));
     glReadPixels(0, 0, kWidth, kHeight, GL_DEPTH_COMPONENT, GL_UNSIGNED_INT, frame.depth.data());
     return frame;
