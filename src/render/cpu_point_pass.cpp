@@ -102,18 +102,6 @@ std::optional<PointRasterization> pointRasterizationNamed(std::string_view name)
   return std::nullopt;
 }
 
-std::string_view nameOfPointRasterization(PointRasterization mode) {
-  switch (mode) {
-    case PointRasterization::OpenGL:
-      return "gl";
-    case PointRasterization::Cpu:
-      return "cpu";
-    case PointRasterization::Auto:
-      break;
-  }
-  return "auto";
-}
-
 bool currentContextIsSoftware() {
   const auto* renderer = reinterpret_cast<const char*>(glGetString(GL_RENDERER));
   if (renderer == nullptr) {

@@ -30,7 +30,6 @@ namespace cloudreel {
 enum class PointRasterization { Auto, OpenGL, Cpu };
 
 std::optional<PointRasterization> pointRasterizationNamed(std::string_view name);
-std::string_view nameOfPointRasterization(PointRasterization mode);
 
 // True when the current context's OpenGL is a software rasteriser.
 bool currentContextIsSoftware();

@@ -279,12 +279,18 @@ void OfflineGLRenderer::renderColorFrameOfDocumentForCamera(MyDocument& document
         "points are drawn through OpenGL");
     warnedNoCpuPass_ = true;
   }
-  if (framebuffer_ && drawsPointsOnCpu()) {
-    if (!pointPass_) {
-      pointPass_ = std::make_unique<CpuPointPass>();
-    }
+  const bool onCpu = framebuffer_ && drawsPointsOnCpu();
+  if (onCpu && !pointPass_) {
+    pointPass_ = std::make_unique<CpuPointPass>();
+  }
+  if (framebuffer_ && pointPass_) {
+    // Also when this frame draws its points through OpenGL: what an earlier
+    // frame left in the pass is not this frame.
+    pointPass_->beginFrame(framebuffer_->width(), framebuffer_->height(),
+                           framebuffer_->depthBits());
+  }
+  if (onCpu) {
     pass = pointPass_.get();
-    pass->beginFrame(framebuffer_->width(), framebuffer_->height(), framebuffer_->depthBits());
   }
   renderOptions_.setCpuPointPass(pass);
   document.drawContentWithOptions(renderOptions_);

@@ -10,6 +10,7 @@
 #include <epoxy/gl.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -213,6 +214,27 @@ TEST_F(CpuPointPassTest, LayersTheCpuCannotDrawExactlyGoThroughOpenGL) {
   EXPECT_EQ(onCpu(), 0u);
   layer->setDrawMode(0);
   EXPECT_EQ(onCpu(), 5000u);
+}
+
+TEST_F(CpuPointPassTest, ARendererSwitchedToOpenGLShowsItsOwnFrame) {
+  auto layer = cloud(5000, 41);
+  document.addLayer(layer);
+  const auto context = document.sharedGLContext();
+  ASSERT_TRUE(context);
+  auto renderer = OfflineGLRenderer::initWithSceneContextExportDepth(
+      OpenGLScene::initWithWidthHeightFieldOfView(kWidth, kHeight, 50.0), *context, false);
+  ASSERT_TRUE(renderer);
+  renderer->setPointRasterization(PointRasterization::Cpu);
+  auto drawn = renderer->drawFrameOfDocumentForCamera(0, document, testCamera());
+  EXPECT_EQ(renderer->pointsDrawnOnCpu(), 5000u);
+  // The next frame has nothing in it: no point of the last one may remain.
+  layer->setIsVisible(false);
+  renderer->setPointRasterization(PointRasterization::OpenGL);
+  drawn = renderer->drawFrameOfDocumentForCamera(1, document, testCamera());
+  ASSERT_EQ(drawn.colour.size(), 1u);
+  const auto& pixels = drawn.colour[0].image.pixels;
+  EXPECT_EQ(std::count(pixels.begin(), pixels.end(), 0), static_cast<long>(pixels.size()));
+  EXPECT_EQ(renderer->pointsDrawnOnCpu(), 0u);
 }
 
 TEST(PointRasterizer, ThreadsShareTheWorkWithoutChangingTheFrame) {
